@@ -1,0 +1,10 @@
+# karnet_library(NAME SOURCES... DEPENDS libs...)
+# One static library per subsystem folder, includes rooted at src/.
+function(karnet_library name)
+  cmake_parse_arguments(KL "" "" "SOURCES;DEPENDS" ${ARGN})
+  add_library(${name} STATIC ${KL_SOURCES})
+  target_include_directories(${name} PUBLIC ${KARNET_SRC_DIR})
+  if(KL_DEPENDS)
+    target_link_libraries(${name} PUBLIC ${KL_DEPENDS})
+  endif()
+endfunction()

@@ -1,0 +1,27 @@
+#ifndef KARNET_CONTROL_TERMINATION_H_
+#define KARNET_CONTROL_TERMINATION_H_
+
+#include <cstddef>
+#include <cstdint>
+
+namespace karnet {
+
+// The RUN TIME INFORMATION block: "Successful" for code 0, else "Abnormal".
+void runTimeReport(std::int32_t completionCode);
+
+// Report, close the log and end the process with the code. Never returns.
+[[noreturn]] void exitRun(std::int32_t exitCode);
+
+// Log the message, show it unless buildmode=nigth (or H84 unset), then
+// exitRun with *exitCode, or 1 when exitCode is null.
+[[noreturn]] void fatalError(const char* message, const std::int32_t* exitCode = nullptr);
+
+// "CAPTION: MESSAGE" on stderr (plain mode) or through the progress host (apv mode).
+int showMessage(const char* text);
+
+// The running program's base name (no directory, no extension) into buffer.
+void moduleBaseName(char* buffer, std::size_t size);
+
+}  // namespace karnet
+
+#endif  // KARNET_CONTROL_TERMINATION_H_

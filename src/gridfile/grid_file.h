@@ -1,0 +1,70 @@
+#ifndef KARNET_GRIDFILE_GRID_FILE_H_
+#define KARNET_GRIDFILE_GRID_FILE_H_
+
+// Gridded data files (NetCDF). Every call returns 0 for success and non-zero for
+// failure and never throws. Items are numbered from 1.
+
+#include <cstdint>
+#include <string>
+
+namespace karnet {
+
+struct GrdHeader;       // what is known about a file: items, axes, crs, custom blocks
+struct GrdFile;         // an open file
+struct GrdItem;         // one item (data variable) of a header
+struct GrdCustomBlock;  // one float global attribute
+
+int grdInitSystem();
+
+// ---- reading ----
+int grdFileRead(const char* fileName, GrdHeader** header, GrdFile** file);
+int grdGetNoOfItems(GrdHeader* header);
+GrdItem* grdItemD(GrdHeader* header, int itemNumber);  // null when there is no such item
+int grdSetItemUnitConversion(GrdItem* item, int a, int b);  // converts nothing
+// 5: two equidistant spatial axes; 10: three; 0: anything else.
+int grdGetItemAxisType(GrdItem* item);
+int grdGetItemAxisEqD2(GrdItem* item, std::int32_t* jStart, std::int32_t* kStart,
+                       std::int32_t* nx, std::int32_t* ny, double* xOrigin, double* yOrigin,
+                       float* dx, float* dy);
+int grdGetGeoInfoUTMProj(GrdHeader* header, std::string* projection, double* longitude,
+                         double* latitude, double* orientation);
+int grdGetCustomBlockRef(GrdHeader* header, GrdCustomBlock** first);
+// type (1), name, number of values, values (owned by the header), next block (null at the end).
+int grdGetCustomBlock(GrdCustomBlock* block, std::int32_t* type, const char** name,
+                      std::int32_t* count, const float** values, GrdCustomBlock** next);
+// Minimum and maximum of the item over all values that differ from its delete value;
+// both are the delete value when there is none. third may be null.
+int grdGetItemStatsGlobal(GrdItem* item, double* minimum, double* maximum, double* third);
+int grdFindBlockDynamic(GrdHeader* header, GrdFile* file);
+// Reads the next time step of item 1 into data (nx*ny[*nz] floats, x fastest).
+int grdReadItemTimeStep(GrdHeader* header, GrdFile* file, double* time, float* data);
+// Destroys the header (and closes a file opened for reading with it); sets *header to null.
+void grdHeaderDestroy(GrdHeader** header);
+
+// ---- writing ----
+int grdHeaderCreate(int itemCount, const char* fileName, const char* title, int a, int b, int c,
+                    GrdHeader** header);
+int grdSetDeleteValFloat(GrdHeader* header, float value);
+int grdSetDeleteValDouble(GrdHeader* header, double value);
+int grdSetDataType(GrdHeader* header, int dataType);
+int grdSetEqTimeAxis(GrdHeader* header, int unit, double start, double step, int firstStep);
+int grdSetItemInfo(GrdHeader* header, GrdItem* item, std::int32_t itemType, const char* key,
+                   std::int32_t unit, int flag);
+int grdSetItemAxisEqD3(GrdItem* item, int axisUnit, std::int32_t nx, std::int32_t ny,
+                       std::int32_t nz, float x0, float y0, float z0, float dx, float dy,
+                       float dz);
+int grdAddCustomBlock(GrdHeader* header, int type, const char* name, std::int32_t count,
+                      const float* values);
+int grdSetGeoInfoUTMProj(GrdHeader* header, const char* projection, double longitude,
+                         double latitude, double orientation);
+// Creates the file under a temporary name beside fileName.
+int grdFileCreate(const char* fileName, GrdHeader* header, GrdFile** file);
+int grdWriteItemTimeStep(GrdHeader* header, GrdFile* file, double time, const float* data);
+// Closes the file; a complete file is renamed to its final name. Sets *file to null.
+int grdFileClose(GrdHeader* header, GrdFile** file);
+// Drops a file that was created but must not appear (temporary file removed).
+int grdFileAbandon(GrdHeader* header, GrdFile** file);
+
+}  // namespace karnet
+
+#endif  // KARNET_GRIDFILE_GRID_FILE_H_

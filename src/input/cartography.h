@@ -1,0 +1,42 @@
+#ifndef KARNET_INPUT_CARTOGRAPHY_H_
+#define KARNET_INPUT_CARTOGRAPHY_H_
+
+#include <memory>
+#include <string>
+
+namespace karnet {
+
+// A map projection on PROJ: LOCAL (identity), UTM-<zone>[N|S], EPSG:<code>,
+// a PROJ string or WKT of a projected CRS.
+class Cartography {
+ public:
+  // Throws std::runtime_error when the projection text is not usable.
+  Cartography(const std::string& projection, double longitude, double latitude,
+              double orientation);
+  ~Cartography();
+  Cartography(const Cartography&) = delete;
+  Cartography& operator=(const Cartography&) = delete;
+
+  void geoToProj(double longitude, double latitude, double* x, double* y) const;
+  void projToGeo(double x, double y, double* longitude, double* latitude) const;
+  // Meridian convergence in degrees (clockwise from true north to grid north).
+  double convergence(double longitude, double latitude) const;
+  // WKT of the projected CRS, empty when there is none (LOCAL).
+  std::string wkt() const;
+
+ private:
+  struct Impl;
+  std::unique_ptr<Impl> impl_;
+};
+
+// The process-wide cartography object of a run.
+// 0 on success, -1 when the object cannot be made (the old one is gone then).
+int cartographyCreate(double longitude, double latitude, double orientation,
+                      const char* projection);
+void cartographyGeoToProj(double longitude, double latitude, double* x, double* y);
+void cartographyProjToGeo(double x, double y, double* longitude, double* latitude);
+double cartographyConvergence(double longitude, double latitude);
+
+}  // namespace karnet
+
+#endif  // KARNET_INPUT_CARTOGRAPHY_H_

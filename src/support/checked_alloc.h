@@ -1,0 +1,28 @@
+#ifndef KARNET_SUPPORT_CHECKED_ALLOC_H_
+#define KARNET_SUPPORT_CHECKED_ALLOC_H_
+
+#include <cstdint>
+
+namespace karnet {
+
+// Guarded allocator used for every grid, description and work array.
+// At most 512 blocks are live at a time; every block carries the guard words
+// "1234" right before and "9876" right after its user area (which is aligned to
+// 16 bytes). Failures never return: the message goes to stderr and the run ends
+// with exit code 1 through exitRun.
+void* checkedAlloc(std::uint64_t size);
+void checkedFree(void* p);
+
+// Writes the message of the error code to stderr and ends the run (code 1).
+// 0 no free slot, 1 out of memory, 2 unknown pointer, 3 low guard, 4 high guard.
+[[noreturn]] void memoryError(int code, const void* p);
+
+// Typed convenience: count elements of T from the checked allocator.
+template <typename T>
+T* checkedAllocArray(std::uint64_t count) {
+  return static_cast<T*>(checkedAlloc(count * sizeof(T)));
+}
+
+}  // namespace karnet
+
+#endif  // KARNET_SUPPORT_CHECKED_ALLOC_H_
