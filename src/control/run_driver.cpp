@@ -1,1 +1,69 @@
-// placeholder: being written
+#include "control/run_driver.h"
+
+#include <cstdlib>
+
+#include "analysis/objective_analysis.h"
+#include "control/log.h"
+#include "control/progress.h"
+#include "control/signals.h"
+#include "control/termination.h"
+#include "input/bathymetry_scan.h"
+#include "input/data_scan.h"
+#include "input/run_initialise.h"
+#include "interp/glo2loc.h"
+#include "interp/interp.h"
+#include "output/result_write.h"
+#include "params/run_parameters.h"
+#include "params/run_settings.h"
+#include "state/run_state.h"
+
+namespace karnet {
+
+void reportInitError(std::int32_t /*lineNumber*/, const char* message) {
+  logPrintf("\nERROR: %s\n", message);
+  exitRun(1);
+}
+
+int runPhases() {
+  RunState& state = runState();
+  const RunSettings& settings = runSettings;
+  std::int32_t lastObs = -1, jOff = 0, kOff = 0, lOff = 0;
+
+  progressStatus("Scanning data ...");
+  dataScan(state, settings, runParameters.inputFiles.FileName, &lastObs, &jOff, &kOff, &lOff);
+  progressStatus("Scanning bathymetry ...");
+  bathymetryScan(jOff, kOff, lOff, state, settings);
+  progressStatus("Initialising ...");
+  if (settings.Analysis == 0) {
+    objectiveAnalysis(lastObs, jOff, kOff, lOff, state, settings);
+  } else {
+    interp(lastObs, jOff, kOff, lOff, state, settings);
+  }
+  glo2loc(jOff, kOff, lOff, state, settings);
+  progressStatus("Saving data ...");
+  return resultWrite(runParameters.outputData.FileName, *state.resultDescription, 1,
+                     runParameters.outputData.ItemType, state.localValues, settings.projection);
+}
+
+void freeRunArrays(RunState& state) {
+  grid3DFree(state.localValues);
+  scatterDataFree(state.scatter);
+  descriptionFree(state.resultDescription);
+  state.resultDescription = nullptr;
+}
+
+void runDriver() {
+  installSignalHandlers();
+  runInitialise(runState(), runSettings);
+  const int written = runPhases();
+  // A run whose result could not be written has not produced what it was for.
+  if (written == 0) {
+    logWrite("\nERROR while writing result file\n");
+    exitRun(1);
+  }
+  freeRunArrays(runState());
+  restoreSignalHandlers();
+  exitRun(0);
+}
+
+}  // namespace karnet

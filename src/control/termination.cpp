@@ -1,1 +1,130 @@
-// placeholder: being written
+// The one way a run ends: the run-time report, the fatal message and the exit.
+#include "control/termination.h"
+
+#include <strings.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <ctime>
+
+#include "control/host.h"
+#include "control/log.h"
+
+namespace karnet {
+namespace {
+
+constexpr int kErrorStyle = 16;
+constexpr std::size_t kNameSize = 260;
+constexpr std::size_t kLineSize = 256;
+
+volatile std::sig_atomic_t endingStarted = 0;
+
+bool environmentEquals(const char* name, const char* value) {
+  const char* actual = std::getenv(name);
+  return actual != nullptr && strcasecmp(actual, value) == 0;
+}
+
+// Writes the report, closes the log and restores the terminal. A second
+// caller (a signal arriving while the run already ends) finds nothing to do.
+void finishRun(std::int32_t exitCode) {
+  endingStarted = 1;
+  runTimeReport(exitCode);
+  logClose();
+  apvShutdown();
+}
+
+// Logs the message and shows it to the user unless the environment says not to.
+void reportFatal(const char* message) {
+  logWrite(message);
+  if (environmentEquals("buildmode", "nigth")) return;
+  if (environmentEquals("H84", "apv") || environmentEquals("H84", "win")) showMessage(message);
+}
+
+}  // namespace
+
+void runTimeReport(std::int32_t completionCode) {
+  char line[kLineSize];
+  // clock() counts processor time in CLOCKS_PER_SEC ticks; whole seconds only.
+  const long seconds = static_cast<long>(std::clock() / CLOCKS_PER_SEC);
+  logWrite("\n");
+  logWrite("--------------- RUN TIME INFORMATION --------------\n");
+  logWrite("--\n");
+  std::snprintf(line, sizeof line, "-- CPU time        : %d [s]\n", static_cast<int>(seconds));
+  logWrite(line);
+  logWrite("--\n");
+  std::snprintf(line, sizeof line, "-- Completion code : %s\n",
+                completionCode == 0 ? "Successful" : "Abnormal");
+  logWrite(line);
+  logWrite("--\n");
+  logWrite("---------------------------------------------------\n");
+}
+
+bool runEnding() { return endingStarted != 0; }
+
+void exitRun(std::int32_t exitCode) {
+  if (endingStarted != 0) std::_Exit(exitCode);
+  finishRun(exitCode);
+  std::exit(exitCode);
+}
+
+void fatalError(const char* message, const std::int32_t* exitCode) {
+  const std::int32_t code = exitCode != nullptr ? *exitCode : 1;
+  if (endingStarted != 0) std::_Exit(code);
+  endingStarted = 1;
+  reportFatal(message);
+  finishRun(code);
+  std::exit(code);
+}
+
+void fatalErrorInSignal(const char* message, std::int32_t exitCode) {
+  if (endingStarted == 0) {
+    endingStarted = 1;
+    reportFatal(message);
+    finishRun(exitCode);
+  }
+  std::fflush(stderr);
+  _exit(exitCode);
+}
+
+int showMessage(const char* text) {
+  char caption[kNameSize] = "";
+  moduleBaseName(caption, sizeof caption);
+  if (text == nullptr) text = "";
+  if (environmentEquals("H84", "apv")) return apvMessage(text, caption, kErrorStyle);
+
+  // On a terminal the message box becomes one line; the newlines that frame
+  // some messages in the log are left out of it. It never waits for a key.
+  std::size_t begin = 0;
+  std::size_t end = std::strlen(text);
+  while (begin < end && (text[begin] == '\n' || text[begin] == '\r')) ++begin;
+  while (end > begin && (text[end - 1] == '\n' || text[end - 1] == '\r')) --end;
+  const int length = static_cast<int>(end - begin);
+  if (caption[0] != '\0') {
+    std::fprintf(stderr, "%s: %.*s\n", caption, length, text + begin);
+  } else {
+    std::fprintf(stderr, "%.*s\n", length, text + begin);
+  }
+  std::fflush(stderr);
+  return 1;
+}
+
+void moduleBaseName(char* buffer, std::size_t size) {
+  if (buffer == nullptr || size == 0) return;
+  char path[4096];
+  const ssize_t length = readlink("/proc/self/exe", path, sizeof path - 1);
+  if (length <= 0) return;
+  path[length] = '\0';
+  const char* slash = std::strrchr(path, '/');
+  const char* name = slash != nullptr ? slash + 1 : path;
+  std::size_t nameLength = std::strlen(name);
+  const char* dot = std::strrchr(name, '.');
+  if (dot != nullptr) nameLength = static_cast<std::size_t>(dot - name);
+  if (nameLength >= size) nameLength = size - 1;
+  std::memcpy(buffer, name, nameLength);
+  buffer[nameLength] = '\0';
+}
+
+}  // namespace karnet

@@ -16,6 +16,14 @@ void runTimeReport(std::int32_t completionCode);
 // exitRun with *exitCode, or 1 when exitCode is null.
 [[noreturn]] void fatalError(const char* message, const std::int32_t* exitCode = nullptr);
 
+// The same fatal path for use inside a signal handler: nothing but the log
+// lines, the message, the terminal restore and _exit(exitCode), so that no
+// exit handlers or destructors run in the signal context.
+[[noreturn]] void fatalErrorInSignal(const char* message, std::int32_t exitCode);
+
+// True once exitRun or one of the fatal paths has started to end the process.
+bool runEnding();
+
 // "CAPTION: MESSAGE" on stderr (plain mode) or through the progress host (apv mode).
 int showMessage(const char* text);
 

@@ -1,1 +1,270 @@
-// placeholder: being written
+#include "input/data_scan.h"
+
+#include <cerrno>
+#include <cmath>
+#include <cstdio>
+#include <algorithm>
+#include <cstdlib>
+#include <limits>
+#include <string>
+
+#include "control/log.h"
+#include "control/progress.h"
+#include "control/termination.h"
+#include "input/bathymetry_read.h"
+#include "input/cartography.h"
+#include "params/run_settings.h"
+#include "state/run_state.h"
+#include "support/file_description.h"
+
+namespace karnet {
+namespace {
+
+constexpr std::int64_t kMaxCount = 2147483647;
+
+[[noreturn]] void stopScan(RunState& state, const char* message) {
+  logWrite(message);
+  releaseAll(state);
+  exitRun(1);
+}
+
+// The grid frame: projected coordinates turned by the grid rotation.
+struct Rotation {
+  double co = 1, si = 0;
+  void turn(double x, double y, double* xt, double* yt) const {
+    *xt = x * co + y * si;
+    *yt = y * co - x * si;
+  }
+};
+
+struct Extent {
+  double min, max;
+  void add(double v) {
+    if (v < min) min = v;
+    if (v > max) max = v;
+  }
+};
+
+// Extents of the bathymetry nodes in the grid frame.
+void bathymetryExtents(const FileDescription& d, const Rotation& r, Extent& x, Extent& y) {
+  double x0 = 0, y0 = 0;
+  cartographyGeoToProj(d.axes[1].origin, d.axes[2].origin, &x0, &y0);
+  const AxisDescription& ax = d.axes[1];
+  const AxisDescription& ay = d.axes[2];
+  const std::int32_t iFirst = static_cast<std::int32_t>(ax.start);
+  const std::int32_t jFirst = static_cast<std::int32_t>(ay.start);
+  for (std::int32_t j = jFirst; j <= jFirst + ay.lastIndex; ++j) {
+    const double yp = y0 + static_cast<double>(static_cast<float>(j) * ay.spacing * ay.factor);
+    for (std::int32_t i = iFirst; i <= iFirst + ax.lastIndex; ++i) {
+      const double xp =
+          x0 + static_cast<double>(static_cast<float>(i) * ax.spacing * ax.factor);
+      double xt, yt;
+      r.turn(xp, yp, &xt, &yt);
+      x.add(xt);
+      y.add(yt);
+    }
+  }
+}
+
+// Parses "x y z value": four finite numbers separated by white space; anything
+// after the fourth is ignored. False for fewer or non-finite numbers.
+bool parseObservation(const char* line, double out[4]) {
+  const char* p = line;
+  for (int n = 0; n < 4; ++n) {
+    char* end = nullptr;
+    errno = 0;
+    const double v = std::strtod(p, &end);
+    if (end == p || !std::isfinite(v)) return false;
+    out[n] = v;
+    p = end;
+  }
+  return true;
+}
+
+// Reads one line of any length into text, without its line feed. False at end of file.
+bool readLine(std::FILE* file, std::string& text) {
+  text.clear();
+  char buffer[4096];
+  bool any = false;
+  while (std::fgets(buffer, sizeof buffer, file) != nullptr) {
+    any = true;
+    text += buffer;
+    if (!text.empty() && text.back() == '\n') {
+      text.pop_back();
+      return true;
+    }
+  }
+  return any;
+}
+
+[[noreturn]] void waterFileError(RunState& state, std::int64_t lineNumber) {
+  logWrite("\nERROR while reading water file\n");
+  logPrintf("      line number: %lld\n", static_cast<long long>(lineNumber));
+  releaseAll(state);
+  exitRun(1);
+}
+
+// Reads every observation line, turned into the grid frame. Returns the count.
+std::int64_t readObservations(RunState& state, const Rotation& r, Extent ext[3]) {
+  ScatterData& sd = state.scatter;
+  std::FILE* file = state.observationFile;
+  std::rewind(file);
+  std::string line;
+  std::int64_t stored = 0;
+  std::int64_t lineNumber = 0;
+  while (readLine(file, line)) {
+    ++lineNumber;
+    if (stored % 1000 == 0) progressCheckCancel();
+    double v[4];
+    if (!parseObservation(line.c_str(), v)) waterFileError(state, lineNumber);
+    // The arrays were sized from the line count; a file that grew since then
+    // must not write past them.
+    if (stored >= sd.capacity) waterFileError(state, lineNumber);
+    const double x = v[0], y = v[1];
+    sd.x[stored] = y * r.si + x * r.co;
+    sd.y[stored] = y * r.co - x * r.si;
+    sd.z[stored] = v[2];
+    sd.value[stored] = v[3];
+    ext[0].add(sd.x[stored]);
+    ext[1].add(sd.y[stored]);
+    ext[2].add(sd.z[stored]);
+    ++stored;
+  }
+  std::fclose(file);
+  state.observationFile = nullptr;
+  return stored;
+}
+
+}  // namespace
+
+BasicAxis layBasicAxis(double dataMin, double dataMax, double localFirst, float spacing,
+                       std::int32_t firstIndex, std::int32_t lastIndex) {
+  const double d = static_cast<double>(spacing);
+  BasicAxis a;
+  if (dataMin < localFirst) {
+    const double steps = std::trunc((localFirst - dataMin) / d) + 1;
+    if (!(steps <= static_cast<double>(kMaxCount))) {
+      a.count = std::numeric_limits<std::int64_t>::max();
+      return a;
+    }
+    const auto n = static_cast<std::int32_t>(steps);
+    a.origin = localFirst - static_cast<double>(static_cast<float>(n) * spacing);
+  } else {
+    a.origin = localFirst;
+    a.originWarning = dataMin > localFirst;
+  }
+  a.offset = static_cast<std::int64_t>(std::trunc((localFirst - a.origin) / d + 0.5));
+  const double spanNodes = std::trunc((dataMax - a.origin) / d) + 1;
+  const double localNodes =
+      static_cast<double>(lastIndex) + 1 + static_cast<double>(a.offset - firstIndex);
+  const double m = spanNodes > localNodes ? spanNodes : localNodes;
+  if (!(m <= static_cast<double>(kMaxCount))) {
+    a.count = std::numeric_limits<std::int64_t>::max();
+    return a;
+  }
+  const float mSpan = static_cast<float>(static_cast<std::int32_t>(m)) * spacing;
+  a.count = static_cast<std::int64_t>(
+                std::trunc((static_cast<double>(mSpan) + a.origin - a.origin) / d + 0.5)) +
+            1;
+  return a;
+}
+
+void dataScan(RunState& state, const RunSettings& s, const char* bathymetryFile,
+              std::int32_t* lastObs, std::int32_t* jOff, std::int32_t* kOff,
+              std::int32_t* lOff) {
+  double longitude = 0, latitude = 0;
+  cartographyProjToGeo(s.xOrigo, s.yOrigo, &longitude, &latitude);
+  const double gamma = cartographyConvergence(longitude, latitude);
+  const double theta = (s.orientation - gamma) * (-3.141592654) / 180;
+  Rotation r;
+  r.co = std::cos(theta);
+  r.si = std::sin(theta);
+  double xg0, yg0;
+  r.turn(s.xOrigo, s.yOrigo, &xg0, &yg0);
+  const double zg0 = static_cast<double>(static_cast<float>(s.l0 - s.lx - 1) * s.dz);
+
+  progressStatus("Reading bathymetry file ...");
+  FileDescription* bathymetry = descriptionNew(2);
+  if (bathymetry == nullptr) stopScan(state, "\nUnable to allocate memory \n");
+  if (bathymetryRead(bathymetryFile, *bathymetry, 1, state.bathymetryGrid) == 0) {
+    descriptionFree(bathymetry);
+    stopScan(state, "\nERROR while reading bathymetry file\n");
+  }
+  const double bedMin = static_cast<double>(bathymetry->items[1].values[1]);
+  constexpr double kInf = std::numeric_limits<double>::infinity();
+  Extent bx{kInf, -kInf}, by{kInf, -kInf};
+  bathymetryExtents(*bathymetry, r, bx, by);
+  descriptionFree(bathymetry);
+
+  progressStatus("Reading data file ...");
+  Extent obs[3] = {{1e9, -1e9}, {1e9, -1e9}, {1e9, -1e9}};
+  const std::int64_t count = readObservations(state, r, obs);
+
+  const double xMin = std::min(obs[0].min, bx.min), xMax = std::max(obs[0].max, bx.max);
+  const double yMin = std::min(obs[1].min, by.min), yMax = std::max(obs[1].max, by.max);
+  const double zMin = std::min(obs[2].min, bedMin), zMax = std::max(obs[2].max, 0.0);
+
+  const BasicAxis ax = layBasicAxis(xMin, xMax, xg0, s.dx, s.j0, s.jx);
+  if (ax.originWarning) logWrite("\nWARNING : X-origo outside of digitized data\n");
+  const BasicAxis ay = layBasicAxis(yMin, yMax, yg0, s.dy, s.k0, s.kx);
+  if (ay.originWarning) logWrite("\nWARNING : Y-origo outside of digitized data\n");
+  const BasicAxis az = layBasicAxis(zMin, zMax, zg0, s.dz, s.l0, s.lx);
+  if (az.originWarning) logWrite("\nWARNING : Z-origo outside of digitized data\n");
+
+  if (xg0 + static_cast<double>(static_cast<float>(s.jx - s.j0) * s.dx) > xMax) {
+    logWrite("\nWARNING: X-upper bound outside of digitized data\n");
+  }
+  if (yg0 + static_cast<double>(static_cast<float>(s.kx - s.k0) * s.dy) > yMax) {
+    logWrite("\nWARNING: Y-upper bound outside of digitized data\n");
+  }
+  if (static_cast<double>(static_cast<float>(s.lx - s.l0) * s.dz) > zMax) {
+    logWrite("\nWARNING: Z-upper bound outside of digitized data\n");
+  }
+
+  // Far-off observations can ask for a basic grid beyond what the grid records
+  // (32-bit counts) and memory can hold.
+  const bool tooLarge = ax.count > kMaxCount || ay.count > kMaxCount || az.count > kMaxCount ||
+                        ax.count < 1 || ay.count < 1 || az.count < 1 ||
+                        ax.count * ay.count > kMaxCount ||
+                        ax.count * ay.count * az.count > kMaxCount;
+  if (tooLarge) stopScan(state, "\nERROR: basic grid too large\n");
+
+  *lastObs = static_cast<std::int32_t>(count - 1);
+  *jOff = static_cast<std::int32_t>(ax.offset);
+  *kOff = static_cast<std::int32_t>(ay.offset);
+  *lOff = static_cast<std::int32_t>(az.offset);
+
+  ScatterData& sd = state.scatter;
+  const double dx = s.dx, dy = s.dy, dz = s.dz;
+  for (std::int64_t n = 0; n < count; ++n) {
+    sd.x[n] = (sd.x[n] - ax.origin) / dx;
+    sd.y[n] = (sd.y[n] - ay.origin) / dy;
+    sd.z[n] = (sd.z[n] - az.origin) / dz;
+  }
+
+  const auto nj = static_cast<std::int32_t>(ax.count);
+  const auto nk = static_cast<std::int32_t>(ay.count);
+  const auto nl = static_cast<std::int32_t>(az.count);
+  for (FloatGrid3D* g : {&state.basicBathymetry, &state.basicValues}) {
+    *g = FloatGrid3D{};
+    g->nj = nj;
+    g->nk = nk;
+    g->nl = nl;
+    g->total = std::int64_t{nj} * nk * nl;
+    grid3DAlloc(*g);
+  }
+  for (FloatGrid2D* g : {&state.layerBathymetry, &state.layerValues}) {
+    *g = FloatGrid2D{};
+    g->nj = nj;
+    g->nk = nk;
+    grid2DAlloc(*g);
+  }
+
+  logWrite("\nBasic grid parameters:\n");
+  logWrite("\n");
+  logPrintf("Number of x-nodes: %4d\n", nj);
+  logPrintf("Number of y-nodes: %4d\n", nk);
+  logPrintf("Number of z-nodes: %4d\n", nl);
+}
+
+}  // namespace karnet

@@ -1,1 +1,69 @@
-// placeholder: being written
+#include "output/result_write.h"
+
+#include <string>
+
+#include "gridfile/grid_file.h"
+#include "gridfile/units.h"
+#include "support/file_description.h"
+#include "support/float_grid.h"
+
+namespace karnet {
+namespace {
+
+// Every header call up to the file's creation; the first failure stops them.
+int describeResult(GrdHeader* header, const FileDescription& d, std::int32_t itemType,
+                   const char* projection) {
+  if (grdSetDeleteValFloat(header, kDeleteValueFloat) != 0) return 1;
+  if (grdSetDeleteValDouble(header, kDeleteValueDouble) != 0) return 1;
+  if (grdSetDataType(header, 0) != 0) return 1;
+  if (grdSetEqTimeAxis(header, 0, 0.0, 1.0, 0) != 0) return 1;
+  std::string key;
+  std::int32_t unit = 0;
+  unitGetItemTypeKey(itemType, &key);
+  unitGetItemUserUnit(itemType, &unit);
+  GrdItem* item = grdItemD(header, 1);
+  if (item == nullptr) return 1;
+  if (grdSetItemInfo(header, item, itemType, key.c_str(), unit, 1) != 0) return 1;
+  if (grdSetItemUnitConversion(item, 3, 0) != 0) return 1;
+  if (grdSetItemAxisEqD3(item, 1000, d.axes[1].lastIndex + 1, d.axes[2].lastIndex + 1,
+                         d.axes[3].lastIndex + 1, 0.0f, 0.0f, 0.0f, d.axes[1].spacing,
+                         d.axes[2].spacing, d.axes[3].spacing) != 0) {
+    return 1;
+  }
+  float misc[7];
+  for (int i = 0; i < 7; ++i) misc[i] = static_cast<float>(d.misc[i]);
+  if (grdAddCustomBlock(header, 1, "Q84_Misc", 7, misc) != 0) return 1;
+  if (grdSetGeoInfoUTMProj(header, projection, d.axes[1].origin, d.axes[2].origin, d.misc[0]) !=
+      0) {
+    return 1;
+  }
+  return 0;
+}
+
+}  // namespace
+
+int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
+                std::int32_t itemType, const FloatGrid3D& values, const char* projection) {
+  grdInitSystem();
+  GrdHeader* header = nullptr;
+  if (grdHeaderCreate(1, fileName, "", 1, 1, 2, &header) != 0) {
+    grdHeaderDestroy(&header);
+    return 0;
+  }
+  GrdFile* file = nullptr;
+  if (describeResult(header, description, itemType, projection) != 0 ||
+      grdFileCreate(fileName, header, &file) != 0) {
+    grdHeaderDestroy(&header);
+    return 0;
+  }
+  if (writeValues != 0 && grdWriteItemTimeStep(header, file, 0.0, values.data) != 0) {
+    grdFileAbandon(header, &file);
+    grdHeaderDestroy(&header);
+    return 0;
+  }
+  const int closed = grdFileClose(header, &file);
+  grdHeaderDestroy(&header);
+  return closed == 0 ? 1 : 0;
+}
+
+}  // namespace karnet

@@ -1,1 +1,144 @@
-// placeholder: being written
+#include "params/run_setup.h"
+
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstring>
+
+#include "control/termination.h"
+#include "input/bathymetry_read.h"
+#include "input/cartography.h"
+#include "params/run_parameters.h"
+#include "params/run_settings.h"
+#include "state/run_state.h"
+#include "support/date_time.h"
+#include "support/file_description.h"
+
+namespace karnet {
+
+RunSettings runSettings;
+
+namespace {
+
+void copyText(char* destination, std::size_t size, const char* source) {
+  const std::size_t n = strnlen(source, size - 1);
+  std::memcpy(destination, source, n);
+  destination[n] = '\0';
+}
+
+bool readable(const char* path) { return path[0] != '\0' && ::access(path, R_OK) == 0; }
+
+// Settings that come from the bathymetry header and the parameters.
+void deriveSettings(const FileDescription& bathymetry, RunSettings& s) {
+  const RunParameters& p = runParameters;
+  s.j0 = static_cast<std::int32_t>(bathymetry.axes[1].start);
+  s.jx = s.j0 + bathymetry.axes[1].lastIndex;
+  s.k0 = static_cast<std::int32_t>(bathymetry.axes[2].start);
+  s.kx = s.k0 + bathymetry.axes[2].lastIndex;
+  s.l0 = p.gridDescription.ZRange[0];
+  s.lx = p.gridDescription.ZRange[1];
+  s.dx = bathymetry.axes[1].spacing;
+  s.dy = bathymetry.axes[2].spacing;
+  s.dz = p.gridDescription.Spacing;
+  s.orientation = bathymetry.misc[0];
+  s.landValue = bathymetry.misc[3];
+  s.startDateTime = DateTime{};
+  s.SearchRadius = p.calculationParameters.SearchRadius;
+  s.MaxExtrapolationDistance[0] = p.calculationParameters.MaxExtrapolationDistance[0];
+  s.MaxExtrapolationDistance[1] = p.calculationParameters.MaxExtrapolationDistance[1];
+  s.Analysis = p.calculationParameters.Analysis;
+  const ObjectiveAnalysisParameters& oa = p.objectiveAnalysisParameters;
+  s.FilterType = oa.FilterType;
+  s.FilterOperations = oa.FilterOperations;
+  s.CorrelationSampleSize = oa.CorrelationSampleSize;
+  s.ZeroCrossingDistance = oa.ZeroCrossingDistance;
+  s.DecayDistance = oa.DecayDistance;
+  s.ErrorVariance = oa.ErrorVariance;
+  s.MaxData = oa.MaxData;
+  s.MinData = oa.MinData;
+  copyText(s.dataFileName, sizeof s.dataFileName, p.inputFiles.DataFileName);
+  copyText(s.projection, sizeof s.projection, p.inputFiles.Projection);
+}
+
+bool calculationParametersValid(const RunSettings& s) {
+  if (0 > s.SearchRadius) return false;
+  if (0 > s.MaxExtrapolationDistance[0] || 0 > s.MaxExtrapolationDistance[1]) return false;
+  if (0 > s.ZeroCrossingDistance || 0 > s.DecayDistance) return false;
+  if (0 > s.ErrorVariance || s.ErrorVariance > 100.0) return false;
+  if (s.CorrelationSampleSize < 1) return false;
+  // The correlation model divides by both distances: with a zero every estimate
+  // of the objective analysis would come out not-a-number.
+  if (s.Analysis == 0 && !(s.DecayDistance > 0 && s.ZeroCrossingDistance > 0)) return false;
+  return true;
+}
+
+}  // namespace
+
+int checkRunSettings(char* buffer, std::size_t size) {
+  const RunSettings& s = runSettings;
+  if (!readable(runParameters.inputFiles.FileName) ||
+      !readable(runParameters.inputFiles.DataFileName)) {
+    std::snprintf(buffer, size, "ERROR: in input file selection");
+    return 0;
+  }
+  if (!(s.j0 <= s.jx) || !(s.k0 <= s.kx)) {
+    std::snprintf(buffer, size, "j0 = %d jx = %d k0 = %d kx = %d", s.j0, s.jx, s.k0, s.kx);
+    return 0;
+  }
+  // A reversed level range would give a local grid with no levels.
+  if (!(s.l0 <= s.lx)) {
+    std::snprintf(buffer, size, "l0 = %d lx = %d", s.l0, s.lx);
+    return 0;
+  }
+  // Node distances divide positions later: zero is as unusable as negative.
+  if (!(s.dx > 0) || !(s.dy > 0)) {
+    std::snprintf(buffer, size, "dx = %f dy = %f", static_cast<double>(s.dx),
+                  static_cast<double>(s.dy));
+    return 0;
+  }
+  if (!(s.dz > 0)) {
+    std::snprintf(buffer, size, "dz = %f", static_cast<double>(s.dz));
+    return 0;
+  }
+  char text[80];
+  DateTime parsed;
+  dateTimeFormat(text, sizeof text, s.startDateTime);
+  if (dateTimeParse(parsed, text) == 0) {
+    std::snprintf(buffer, size, "ERROR: in physical description");
+    return 0;
+  }
+  if (!calculationParametersValid(s)) {
+    std::snprintf(buffer, size, "ERROR: in calculation parameters");
+    return 0;
+  }
+  return 1;
+}
+
+int setupRun(const char* parameterFile) {
+  if (readParameterFile(parameterFile) == 0) fatalError("Error in parameter file");
+
+  FileDescription* bathymetry = descriptionNew(2);
+  if (bathymetry == nullptr) fatalError("Unable to allocate memory");
+  // A file that cannot be read leaves the description at its creation values,
+  // which the validation below rejects.
+  bathymetryRead(runParameters.inputFiles.FileName, *bathymetry, 1, runState().bathymetryGrid);
+  deriveSettings(*bathymetry, runSettings);
+  runState().landValue = runSettings.landValue;
+
+  char message[1024];
+  if (checkRunSettings(message, sizeof message) == 0) fatalError(message);
+
+  const double longitude = bathymetry->axes[1].origin;
+  const double latitude = bathymetry->axes[2].origin;
+  if (cartographyCreate(0.0, 0.0, runSettings.orientation, runSettings.projection) != 0) {
+    fatalError("Unable to initialize geo. system");
+  }
+  cartographyGeoToProj(longitude, latitude, &runSettings.xOrigo, &runSettings.yOrigo);
+  if (cartographyCreate(longitude, latitude, runSettings.orientation, runSettings.projection) !=
+      0) {
+    fatalError("Unable to initialize geo. system");
+  }
+  return 1;
+}
+
+}  // namespace karnet

@@ -17,9 +17,11 @@ void checkedFree(void* p);
 // 0 no free slot, 1 out of memory, 2 unknown pointer, 3 low guard, 4 high guard.
 [[noreturn]] void memoryError(int code, const void* p);
 
-// Typed convenience: count elements of T from the checked allocator.
+// Typed convenience: count elements of T from the checked allocator. A count
+// whose byte size does not fit 64 bits ends the run as "Memory exhausted".
 template <typename T>
 T* checkedAllocArray(std::uint64_t count) {
+  if (count > UINT64_MAX / sizeof(T)) memoryError(1, nullptr);
   return static_cast<T*>(checkedAlloc(count * sizeof(T)));
 }
 

@@ -29,7 +29,7 @@ struct TimeAxisDescription {
 };
 
 struct ItemDescription {
-  float values[8];  // values[2] is the item's minimum, values[3] its second statistic
+  float values[8];  // values[1] and values[2]: the first two statistics (minimum, maximum)
   char name[24];
   std::int32_t integers[2];
 };

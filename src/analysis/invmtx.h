@@ -1,0 +1,24 @@
+#ifndef KARNET_ANALYSIS_INVMTX_H_
+#define KARNET_ANALYSIS_INVMTX_H_
+
+#include <cstdint>
+
+#include "analysis/workspace.h"
+
+namespace karnet {
+
+// Inverts in place the n x n block of the float matrix a (row stride ws.limit)
+// by Gauss-Jordan elimination with full pivoting, in single precision.
+// Returns 0 on success and -1 on failure, with ws.errorText naming the reason:
+//   "NOBS < 1 in INVMTX"               n < 1
+//   "LIMIT < N in INVMTX"              ws.limit < n
+//   "Matrix singular in INVMTX"        a pivot too small
+//   "Determinant too large in INVMTX"  scaled down by ten 76 times or more
+//                                      (det then holds that count)
+// "Determinant very small in INVMTX" (final determinant below 1e-4) is set on
+// success. det receives the determinant. The pivot indices live in ws.pivot.
+std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det);
+
+}  // namespace karnet
+
+#endif  // KARNET_ANALYSIS_INVMTX_H_

@@ -1,0 +1,22 @@
+#ifndef KARNET_INTERP_INTERP_H_
+#define KARNET_INTERP_INTERP_H_
+
+#include <cstdint>
+
+#include "params/run_settings.h"
+#include "state/run_state.h"
+
+namespace karnet {
+
+// Bilinear / distance-weighted analysis: grids the observations (setadj), then
+// fills every empty wet node of the local grid's footprint layer by layer from
+// the quadrant neighbours of the layer as it was before the layer's pass,
+// empties dry footprint nodes, smooths each layer FilterOperations times and
+// writes it back into state.basicValues. Ends with the statistics block in the log.
+// (jOff, kOff, lOff) is the basic node of the local grid's first node.
+void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int32_t lOff,
+            RunState& state, const RunSettings& settings);
+
+}  // namespace karnet
+
+#endif  // KARNET_INTERP_INTERP_H_

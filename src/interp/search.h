@@ -1,0 +1,30 @@
+#ifndef KARNET_INTERP_SEARCH_H_
+#define KARNET_INTERP_SEARCH_H_
+
+#include <cstdint>
+
+#include "params/run_settings.h"
+#include "support/float_grid.h"
+
+namespace karnet {
+
+// Hit lists are indexed from 1: entries 1..4 are used, entry 0 is never touched.
+inline constexpr int kHitListSize = 5;
+
+// Reach of the neighbour search in nodes: SearchRadius / dx in single precision,
+// used for both directions.
+float searchReach(const RunSettings& settings);
+
+// Looks around node (j, k) of layer for the first data node of each quadrant,
+// walking outward ring by ring up to the reach (or the farther grid edge the
+// quadrant faces, whichever is smaller):
+//   Q1: dj > 0, dk >= 0   Q2: dj <= 0, dk > 0   Q3: dj < 0, dk <= 0   Q4: dj >= 0, dk < 0
+// Hits are stored in quadrant order in jHit[1..n], kHit[1..n]; returns n (0..4).
+// The layer's nodes are 0..nj-1, 0..nk-1 at data offset k * nj + j (the work
+// layers have origin (0, 0)). A node holds data when it differs from deleteValue.
+std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
+                    double deleteValue, std::int32_t* jHit, std::int32_t* kHit);
+
+}  // namespace karnet
+
+#endif  // KARNET_INTERP_SEARCH_H_

@@ -1,0 +1,21 @@
+#ifndef KARNET_OUTPUT_RESULT_WRITE_H_
+#define KARNET_OUTPUT_RESULT_WRITE_H_
+
+#include <cstdint>
+
+namespace karnet {
+
+struct FileDescription;
+struct FloatGrid3D;
+
+// Writes the local result grid as a 3-D gridded file with one item of the given
+// type, the description's axes, custom block and geographic information, and
+// (with writeValues) one time step of values. 1 when the file was written and
+// closed, 0 on any failure; a failed write leaves no file under fileName and
+// keeps an earlier file of that name.
+int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
+                std::int32_t itemType, const FloatGrid3D& values, const char* projection);
+
+}  // namespace karnet
+
+#endif  // KARNET_OUTPUT_RESULT_WRITE_H_
