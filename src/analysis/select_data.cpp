@@ -1,7 +1,7 @@
 // Choice of the data cells that inform one node.
 #include "analysis/select_data.h"
 
-#include <cmath>
+#include <algorithm>
 #include <utility>
 
 #include "analysis/correlation.h"
@@ -9,14 +9,36 @@
 namespace karnet {
 namespace {
 
-// True when corr[i] must move behind corr[i + gap]: it is smaller (equal values
-// stay). A not-a-number correlation (a cell on the node when a distance scale
-// is 0) ranks above every number, like the distance 0 it stands for; without a
-// rank it would be exchanged in every pass and the sort would never end.
-bool ranksBelow(float a, float b) {
-  if (std::isnan(a)) return false;
-  if (std::isnan(b)) return true;
-  return a < b;
+// Squared search radius in node units: SearchRadius^2 / dx / dx in single
+// precision, the two divisions in turn.
+float searchRadius2(const RunSettings& settings) {
+  return settings.SearchRadius * settings.SearchRadius / settings.dx / settings.dx;
+}
+
+// Largest whole-node offset o in 0..maxOffset whose square (as a float, the way
+// the distance test forms it) does not exceed r2. A cell further than that in
+// x alone, or in y alone, fails the radius test whatever its other offset.
+std::int32_t reachInNodes(float r2, std::int32_t maxOffset) {
+  std::int32_t o = 0;
+  while (o < maxOffset) {
+    const float next = static_cast<float>(o + 1);
+    if (next * next > r2) break;
+    ++o;
+  }
+  return o;
+}
+
+// Appends data cell i as a candidate of node (nodeX, nodeY) when it lies within
+// the search radius.
+inline void consider(OaWorkspace& ws, std::int32_t i, float nodeX, float nodeY, float radius2,
+                     std::int32_t& count) {
+  const float ddy = nodeY - ws.dataY[i];
+  const float ddx = nodeX - ws.dataX[i];
+  const float d2 = ddy * ddy + ddx * ddx;
+  if (d2 > radius2) return;
+  ws.candIndex[count] = i;
+  ws.candCorr[count] = tabledCorrelation(d2, ws);
+  ++count;
 }
 
 }  // namespace
@@ -29,7 +51,10 @@ void sortByCorrelation(float* corr, std::int32_t* index, std::int32_t n) {
     while (exchanged) {
       exchanged = false;
       for (std::int32_t i = 0; i < n - gap; ++i) {
-        if (ranksBelow(corr[i], corr[i + gap])) {
+        // Only a smaller value moves back: equal values, and a not-a-number
+        // (which compares with nothing), stay where they are, so every pass
+        // series ends.
+        if (corr[i] < corr[i + gap]) {
           std::swap(corr[i], corr[i + gap]);
           std::swap(index[i], index[i + gap]);
           exchanged = true;
@@ -43,20 +68,34 @@ void sortByCorrelation(float* corr, std::int32_t* index, std::int32_t n) {
 
 std::int32_t selectData(OaWorkspace& ws, std::int32_t j, std::int32_t k,
                         const RunSettings& settings) {
-  const float radius2 =
-      settings.SearchRadius * settings.SearchRadius / settings.dx / settings.dx;
+  const float radius2 = searchRadius2(settings);
   const float nodeX = static_cast<float>(j);
   const float nodeY = static_cast<float>(k);
 
   std::int32_t count = 0;
-  for (std::int32_t i = 0; i < ws.dataCount; ++i) {
-    const float ddy = nodeY - ws.dataY[i];
-    const float ddx = nodeX - ws.dataX[i];
-    const float d2 = ddy * ddy + ddx * ddx;
-    if (d2 > radius2) continue;
-    ws.candIndex[count] = i;
-    ws.candCorr[count] = correlation(d2, ws);
-    ++count;
+  if (ws.columnStart != nullptr && ws.columnCount > 0) {
+    // Cells in column order: only the columns, and within a column only the
+    // rows, that the radius can reach are visited, in collection order. Cells
+    // outside that window would fail the radius test anyway.
+    const std::int32_t nj = ws.columnCount;
+    const std::int32_t reach = reachInNodes(radius2, nj - 1);
+    const std::int64_t xFirst = std::max<std::int64_t>(std::int64_t{j} - reach, 0);
+    const std::int64_t xLast = std::min<std::int64_t>(std::int64_t{j} + reach, nj - 1);
+    const float yFirst = static_cast<float>(std::int64_t{k} - reach);
+    for (std::int64_t x = xFirst; x <= xLast; ++x) {
+      const std::int32_t begin = ws.columnStart[x];
+      const std::int32_t end = ws.columnStart[x + 1];
+      const float* first = std::lower_bound(ws.dataY + begin, ws.dataY + end, yFirst);
+      const auto yLast = static_cast<float>(std::int64_t{k} + reach);
+      for (auto i = static_cast<std::int32_t>(first - ws.dataY); i < end && ws.dataY[i] <= yLast;
+           ++i) {
+        consider(ws, i, nodeX, nodeY, radius2, count);
+      }
+    }
+  } else {
+    for (std::int32_t i = 0; i < ws.dataCount; ++i) {
+      consider(ws, i, nodeX, nodeY, radius2, count);
+    }
   }
 
   std::int32_t kept = count;

@@ -2,12 +2,17 @@
 #include "analysis/workspace.h"
 
 #include <algorithm>
+#include <cmath>
 #include <cstdint>
 
+#include "analysis/correlation.h"
 #include "support/checked_alloc.h"
 
 namespace karnet {
 namespace {
+
+// Largest correlation table: beyond it the correlation is computed directly.
+constexpr std::int64_t kMaxCorrelationTable = std::int64_t{1} << 16;
 
 // At least one element per array, so that an empty layer or a degenerate limit
 // never asks the allocator for a zero-sized block.
@@ -20,6 +25,20 @@ template <typename T>
 void release(T*& p) {
   if (p != nullptr) checkedFree(p);
   p = nullptr;
+}
+
+// Number of table entries worth computing: no squared distance within an
+// nj x nk layer exceeds (nj - 1)^2 + (nk - 1)^2, and beyond the cut-off
+// 40 * decay2 the correlation is 0 at the price of one comparison.
+std::int64_t correlationTableSize(const OaWorkspace& ws, std::int32_t nj, std::int32_t nk) {
+  const std::int64_t sj = std::max<std::int64_t>(nj - 1, 0);
+  const std::int64_t sk = std::max<std::int64_t>(nk - 1, 0);
+  std::int64_t size = std::min(sj * sj + sk * sk + 1, kMaxCorrelationTable);
+  const double cutOff = 40.0 * static_cast<double>(ws.decay2);
+  if (cutOff >= 0.0 && cutOff < static_cast<double>(size)) {
+    size = static_cast<std::int64_t>(std::floor(cutOff)) + 1;
+  }
+  return size;
 }
 
 }  // namespace
@@ -53,9 +72,48 @@ void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::i
   ws.lineBuffer = allocateEntries<float>(line);
 
   ws.pivot = allocateEntries<std::int32_t>(2 * limit);
-  ws.rowSum = allocateEntries<float>(limit);
-  ws.rowDot = allocateEntries<float>(limit);
+
+  // The table is filled by the very function it stands in for, so a look-up
+  // and a direct evaluation give the same bits.
+  ws.corrTableSize = 0;
+  const std::int64_t tableSize = correlationTableSize(ws, nj, nk);
+  ws.corrTable = allocateEntries<float>(tableSize);
+  for (std::int64_t i = 0; i < tableSize; ++i) {
+    ws.corrTable[i] = correlation(static_cast<float>(i), ws);
+  }
+  ws.corrTableSize = static_cast<std::int32_t>(tableSize);
+
+  ws.columnCount = 0;
+  ws.columnStart = nullptr;
   ws.errorText = "";
+}
+
+void workspaceIndexColumns(OaWorkspace& ws, std::int32_t nj) {
+  release(ws.columnStart);
+  ws.columnCount = 0;
+  if (nj < 1) return;
+
+  // Column order means: whole-node positions inside the layer, x never
+  // decreasing, and y strictly increasing within a column.
+  for (std::int32_t i = 0; i < ws.dataCount; ++i) {
+    const float x = ws.dataX[i];
+    const float y = ws.dataY[i];
+    if (!(x >= 0.0f && x < static_cast<float>(nj)) || x != std::floor(x)) return;
+    if (!(y >= 0.0f && y < 16777216.0f) || y != std::floor(y)) return;
+    if (i > 0) {
+      const float px = ws.dataX[i - 1];
+      if (x < px || (x == px && !(ws.dataY[i - 1] < y))) return;
+    }
+  }
+
+  ws.columnStart = allocateEntries<std::int32_t>(std::int64_t{nj} + 1);
+  std::int32_t i = 0;
+  for (std::int32_t x = 0; x < nj; ++x) {
+    ws.columnStart[x] = i;
+    while (i < ws.dataCount && ws.dataX[i] == static_cast<float>(x)) ++i;
+  }
+  ws.columnStart[nj] = i;
+  ws.columnCount = nj;
 }
 
 void workspaceRelease(OaWorkspace& ws) {
@@ -71,11 +129,13 @@ void workspaceRelease(OaWorkspace& ws) {
   release(ws.matrix);
   release(ws.lineBuffer);
   release(ws.pivot);
-  release(ws.rowSum);
-  release(ws.rowDot);
+  release(ws.corrTable);
+  release(ws.columnStart);
   ws.dataCapacity = 0;
   ws.dataCount = 0;
   ws.lineCapacity = 0;
+  ws.corrTableSize = 0;
+  ws.columnCount = 0;
 }
 
 }  // namespace karnet

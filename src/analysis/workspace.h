@@ -43,12 +43,22 @@ struct OaWorkspace {
   std::int32_t lineCapacity = 0;
   float* lineBuffer = nullptr;
 
-  // Scratch kept here so that no estimate allocates: the 2 * limit pivot
-  // indices of the matrix inversion and the limit row sums / row products of
-  // the weighted mean.
+  // The 2 * limit pivot indices of the matrix inversion, kept here so that no
+  // estimate allocates.
   std::int32_t* pivot = nullptr;
-  float* rowSum = nullptr;
-  float* rowDot = nullptr;
+
+  // correlation(d2) for the integral squared distances d2 = 0 .. corrTableSize-1.
+  // Node and cell positions are whole node numbers, so nearly every squared
+  // distance of a layer is such an integer; the table spares the exponential.
+  std::int32_t corrTableSize = 0;
+  float* corrTable = nullptr;
+
+  // Column index of the data cells, built by workspaceIndexColumns when the
+  // cells come in column order (x outer, y inner, both ascending): the cells of
+  // column x are entries columnStart[x] .. columnStart[x + 1] - 1. Null when the
+  // cells are in any other order; the selection then scans every cell.
+  std::int32_t columnCount = 0;
+  std::int32_t* columnStart = nullptr;
 
   // Reason of the latest estimator failure (or its warning); never printed.
   const char* errorText = "";
@@ -56,9 +66,15 @@ struct OaWorkspace {
 
 // Sets the scalars from the settings and allocates every array: data and
 // candidate arrays with nData entries, the chosen-cell arrays with limit
-// entries, the matrix with limit * limit and the line buffer with max(nj, nk).
+// entries, the matrix with limit * limit and the line buffer with max(nj, nk);
+// fills the correlation table for the squared distances an nj x nk layer holds.
 void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::int32_t nk,
                     const RunSettings& settings);
+
+// Builds the column index of the ws.dataCount collected data cells for a layer
+// of nj columns, when they lie on whole nodes 0..nj-1 in column order; leaves
+// it empty otherwise. Called once the cells of a layer are collected.
+void workspaceIndexColumns(OaWorkspace& ws, std::int32_t nj);
 
 // Releases every array of the workspace; the scalars keep their values.
 void workspaceRelease(OaWorkspace& ws);

@@ -1,1 +1,237 @@
-// placeholder: being written
+// Four-quadrant neighbour search on a horizontal layer.
+#include "interp/search.h"
+
+#include <algorithm>
+#include <cstdint>
+
+#include "interp/node_tests.h"
+#include "support/checked_alloc.h"
+
+namespace karnet {
+
+namespace {
+
+// A quadrant seen from the node: u points along its first leg's ring side,
+// v is u turned a quarter counterclockwise. Ring r of the quadrant is
+//   leg A: node + r*u + t*v, t = 0 .. r-1,   leg B: node + t*u + r*v, t = 1 .. r,
+// and the rings 1..r together cover the offsets a*u + b*v, a in 1..r, b in 0..r.
+struct Quadrant {
+  std::int32_t uj, uk;
+  std::int32_t vj, vk;
+};
+
+constexpr Quadrant kQuadrants[4] = {
+    {1, 0, 0, 1},    // Q1: dj > 0, dk >= 0
+    {0, 1, -1, 0},   // Q2: dj <= 0, dk > 0
+    {-1, 0, 0, -1},  // Q3: dj < 0, dk <= 0
+    {0, -1, 1, 0},   // Q4: dj >= 0, dk < 0
+};
+
+// The layer as the search sees it.
+struct LayerView {
+  const float* data;
+  std::int64_t nj;
+  std::int64_t nk;
+  double deleteValue;
+};
+
+// Ring limit of a quadrant: the farther of the two edges it faces, cut to the
+// reach when the reach is not greater; below one ring nothing is searched.
+std::int32_t ringLimit(std::int32_t edgeDistance, float reach) {
+  float limit = static_cast<float>(edgeDistance);
+  if (reach <= limit) limit = reach;
+  // limit is at most the edge distance here (or NaN), so the conversion is safe.
+  if (!(limit >= 1.0f)) return 0;
+  return static_cast<std::int32_t>(limit);
+}
+
+// Narrows [lo, hi] to the t for which c + t*step lies in 0 .. n-1.
+void clipAxis(std::int64_t c, std::int32_t step, std::int64_t n, std::int64_t& lo,
+              std::int64_t& hi) {
+  if (step == 0) {
+    if (c < 0 || c > n - 1) hi = lo - 1;
+  } else if (step > 0) {
+    lo = std::max(lo, -c);
+    hi = std::min(hi, n - 1 - c);
+  } else {
+    lo = std::max(lo, c - (n - 1));
+    hi = std::min(hi, c);
+  }
+}
+
+// Walks the candidates (sj + t*dj, sk + t*dk) for t = tFirst .. tLast in order,
+// passing over those outside the layer without reading them. Returns the first
+// t whose node holds data, or -1.
+std::int64_t scanLeg(const LayerView& layer, std::int64_t sj, std::int64_t sk, std::int32_t dj,
+                     std::int32_t dk, std::int64_t tFirst, std::int64_t tLast) {
+  std::int64_t lo = tFirst;
+  std::int64_t hi = tLast;
+  clipAxis(sj, dj, layer.nj, lo, hi);
+  clipAxis(sk, dk, layer.nk, lo, hi);
+  if (lo > hi) return -1;
+  const std::int64_t stride = std::int64_t{dk} * layer.nj + dj;
+  const float* p = layer.data + (sk + lo * dk) * layer.nj + (sj + lo * dj);
+  for (std::int64_t t = lo; t <= hi; ++t, p += stride) {
+    if (!isEmptyCell(*p, layer.deleteValue)) return t;
+  }
+  return -1;
+}
+
+// Scans the quadrant's part of ring r, leg A before leg B. On a hit stores the
+// node in (hj, hk) and returns true.
+bool scanRing(const LayerView& layer, std::int32_t j, std::int32_t k, const Quadrant& q,
+              std::int64_t r, std::int32_t& hj, std::int32_t& hk) {
+  // Leg A: node + r*u + t*v, t = 0 .. r-1.
+  std::int64_t sj = j + r * q.uj;
+  std::int64_t sk = k + r * q.uk;
+  std::int64_t t = scanLeg(layer, sj, sk, q.vj, q.vk, 0, r - 1);
+  if (t >= 0) {
+    hj = static_cast<std::int32_t>(sj + t * q.vj);
+    hk = static_cast<std::int32_t>(sk + t * q.vk);
+    return true;
+  }
+  // Leg B: node + t*u + r*v, t = 1 .. r.
+  sj = j + r * q.vj;
+  sk = k + r * q.vk;
+  t = scanLeg(layer, sj, sk, q.uj, q.uk, 1, r);
+  if (t >= 0) {
+    hj = static_cast<std::int32_t>(sj + t * q.uj);
+    hk = static_cast<std::int32_t>(sk + t * q.uk);
+    return true;
+  }
+  return false;
+}
+
+// Farther of the two grid edges each quadrant faces, in quadrant order.
+void edgeDistances(std::int32_t j, std::int32_t k, std::int32_t nj, std::int32_t nk,
+                   std::int32_t edges[4]) {
+  edges[0] = std::max(nj - 1 - j, nk - 1 - k);
+  edges[1] = std::max(nk - 1 - k, j);
+  edges[2] = std::max(k, j);
+  edges[3] = std::max(k, nj - 1 - j);
+}
+
+// Rings scanned node by node before the count table is consulted: dense data
+// is found there at once, and the table pays off only for farther data.
+constexpr std::int64_t kDirectRings = 3;
+
+// Number of data nodes of the quadrant within rings 1..r (clipped to the layer).
+std::uint32_t quadrantCount(const SearchIndex& index, std::int32_t j, std::int32_t k,
+                            const Quadrant& q, std::int64_t r) {
+  // Offsets a*u + b*v with a in 1..r and b in 0..r: the images of the corners
+  // (1, 0) and (r, r) bound the rectangle.
+  const std::int64_t j1 = j + q.uj, k1 = k + q.uk;
+  const std::int64_t j2 = j + r * (q.uj + q.vj), k2 = k + r * (q.uk + q.vk);
+  const std::int64_t jLo = std::max<std::int64_t>(std::min(j1, j2), 0);
+  const std::int64_t jHi = std::min<std::int64_t>(std::max(j1, j2), index.nj - 1);
+  const std::int64_t kLo = std::max<std::int64_t>(std::min(k1, k2), 0);
+  const std::int64_t kHi = std::min<std::int64_t>(std::max(k1, k2), index.nk - 1);
+  if (jLo > jHi || kLo > kHi) return 0;
+  const std::int64_t w = std::int64_t{index.nj} + 1;
+  const std::uint32_t* c = index.counts;
+  return c[(kHi + 1) * w + jHi + 1] - c[kLo * w + jHi + 1] - c[(kHi + 1) * w + jLo] +
+         c[kLo * w + jLo];
+}
+
+}  // namespace
+
+float searchReach(const RunSettings& settings) { return settings.SearchRadius / settings.dx; }
+
+std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
+                    double deleteValue, std::int32_t* jHit, std::int32_t* kHit) {
+  const LayerView view{layer.data, layer.nj, layer.nk, deleteValue};
+  std::int32_t edges[4];
+  edgeDistances(j, k, layer.nj, layer.nk, edges);
+  std::int32_t count = 0;
+  for (int quadrant = 0; quadrant < 4; ++quadrant) {
+    const std::int32_t rings = ringLimit(edges[quadrant], reach);
+    for (std::int64_t r = 1; r <= rings; ++r) {
+      std::int32_t hj = 0, hk = 0;
+      if (scanRing(view, j, k, kQuadrants[quadrant], r, hj, hk)) {
+        ++count;
+        jHit[count] = hj;
+        kHit[count] = hk;
+        break;
+      }
+    }
+  }
+  return count;
+}
+
+std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
+                    double deleteValue, const SearchIndex& index, std::int32_t* jHit,
+                    std::int32_t* kHit) {
+  const LayerView view{layer.data, layer.nj, layer.nk, deleteValue};
+  std::int32_t edges[4];
+  edgeDistances(j, k, layer.nj, layer.nk, edges);
+  std::int32_t count = 0;
+  for (int quadrant = 0; quadrant < 4; ++quadrant) {
+    const Quadrant& q = kQuadrants[quadrant];
+    const std::int64_t rings = ringLimit(edges[quadrant], reach);
+    std::int32_t hj = 0, hk = 0;
+    bool found = false;
+    const std::int64_t direct = std::min(rings, kDirectRings);
+    for (std::int64_t r = 1; r <= direct && !found; ++r) {
+      found = scanRing(view, j, k, q, r, hj, hk);
+    }
+    if (!found && rings > direct && quadrantCount(index, j, k, q, rings) != 0) {
+      // The first data ring lies in (direct, rings]: gallop outward, then halve.
+      std::int64_t empty = direct;  // rings 1..empty hold no data
+      std::int64_t full = std::min(rings, 2 * direct + 1);
+      while (quadrantCount(index, j, k, q, full) == 0) {
+        empty = full;
+        full = std::min(rings, 2 * full);
+      }
+      while (full - empty > 1) {
+        const std::int64_t mid = empty + (full - empty) / 2;
+        if (quadrantCount(index, j, k, q, mid) == 0) {
+          empty = mid;
+        } else {
+          full = mid;
+        }
+      }
+      // Ring `full` is the first with data, so its scan finds the hit.
+      found = scanRing(view, j, k, q, full, hj, hk);
+    }
+    if (found) {
+      ++count;
+      jHit[count] = hj;
+      kHit[count] = hk;
+    }
+  }
+  return count;
+}
+
+void searchIndexAlloc(SearchIndex& index, std::int32_t nj, std::int32_t nk) {
+  index.nj = std::max(nj, 0);
+  index.nk = std::max(nk, 0);
+  index.counts = checkedAllocArray<std::uint32_t>(
+      static_cast<std::uint64_t>(index.nj + std::int64_t{1}) *
+      static_cast<std::uint64_t>(index.nk + std::int64_t{1}));
+}
+
+void searchIndexFree(SearchIndex& index) {
+  if (index.counts != nullptr) checkedFree(index.counts);
+  index.counts = nullptr;
+}
+
+void searchIndexBuild(SearchIndex& index, const FloatGrid2D& layer, double deleteValue) {
+  const std::int64_t nj = index.nj;
+  const std::int64_t nk = index.nk;
+  const std::int64_t w = nj + 1;
+  std::uint32_t* c = index.counts;
+  std::fill(c, c + w, 0u);
+  for (std::int64_t k = 0; k < nk; ++k) {
+    const float* row = layer.data + k * nj;
+    const std::uint32_t* below = c + k * w;
+    std::uint32_t* here = c + (k + 1) * w;
+    std::uint32_t rowCount = 0;
+    here[0] = 0;
+    for (std::int64_t j = 0; j < nj; ++j) {
+      rowCount += isEmptyCell(row[j], deleteValue) ? 0u : 1u;
+      here[j + 1] = below[j + 1] + rowCount;
+    }
+  }
+}
+
+}  // namespace karnet

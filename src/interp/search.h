@@ -25,6 +25,31 @@ float searchReach(const RunSettings& settings);
 std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
                     double deleteValue, std::int32_t* jHit, std::int32_t* kHit);
 
+// Count table of the data nodes of one layer, so that a search can tell in
+// constant time whether a quadrant holds data within r rings and skip the
+// empty rings. counts has (nj + 1) * (nk + 1) entries: entry (k, j) at
+// k * (nj + 1) + j is the number of data nodes in columns 0..j-1, rows 0..k-1.
+// The caller owns the storage (searchIndexAlloc / searchIndexFree) and rebuilds
+// the table whenever the layer changes.
+struct SearchIndex {
+  std::int32_t nj = 0;
+  std::int32_t nk = 0;
+  std::uint32_t* counts = nullptr;
+};
+
+// Storage for a table of an nj x nk layer, from the checked allocator.
+void searchIndexAlloc(SearchIndex& index, std::int32_t nj, std::int32_t nk);
+void searchIndexFree(SearchIndex& index);
+// Fills the table from layer (whose counts must equal the index's).
+void searchIndexBuild(SearchIndex& index, const FloatGrid2D& layer, double deleteValue);
+
+// The same search, with the hits found through the count table of the layer.
+// Gives exactly the hits of the plain search; it only reads fewer nodes when
+// the data lie far away.
+std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
+                    double deleteValue, const SearchIndex& index, std::int32_t* jHit,
+                    std::int32_t* kHit);
+
 }  // namespace karnet
 
 #endif  // KARNET_INTERP_SEARCH_H_

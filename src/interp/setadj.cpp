@@ -141,7 +141,9 @@ void setadj(std::int32_t lastObs, RunState& state, const RunSettings& settings) 
   grid3DFill(count, 0.0f);
   grid3DFill(values, static_cast<float>(deleteValue));
 
-  ProgressTicker progress((2 * std::int64_t{nl} + 1) * nk * nj + lastObs);
+  const std::int64_t progressTotal = (2 * std::int64_t{nl} + 1) * nk * nj + lastObs;
+  progressStart(progressTotal);
+  ProgressTicker progress(progressTotal);
 
   // Phase 1: binning, sums formed in double and rounded back at every step.
   const ScatterData& scatter = state.scatter;

@@ -1,0 +1,241 @@
+// Complete bilinear runs: the answer, the statistics, the result file, interruptions.
+#include <gtest/gtest.h>
+#include <netcdf.h>
+#include <signal.h>
+
+#include <cmath>
+#include <cstring>
+#include <tuple>
+#include <filesystem>
+#include <sstream>
+
+#include "e2e/e2e_support.h"
+
+namespace karnet::e2e {
+namespace {
+
+const std::map<std::string, std::string> kQuiet = {{"buildmode", "nigth"}};
+
+double plane(double x, double y) { return 3.0 + 0.002 * (x - 1000.0) + 0.001 * (y - 2000.0); }
+
+// A flat 21 x 21 node basin (LOCAL, origin (1000, 2000), 250 m) with casts on every fourth
+// node of a field that is linear in x and y and the same at every depth.
+void writePlaneCase(const TempDir& dir, ParameterFile p) {
+  BathymetrySpec b;
+  b.nx = 21;
+  b.ny = 21;
+  b.projection = "LOCAL";
+  b.originLongitude = 1000.0;
+  b.originLatitude = 2000.0;
+  b.heights.assign(21 * 21, -25.0f);
+  writeBathymetry(dir.file("bathymetry.nc"), b);
+  std::ostringstream obs;
+  obs.precision(17);
+  for (int j = 0; j <= 20; j += 4) {
+    for (int i = 0; i <= 20; i += 4) {
+      const double x = 1000.0 + 250.0 * i, y = 2000.0 + 250.0 * j;
+      for (int level = 1; level <= 10; ++level) {
+        obs << x << ' ' << y << ' ' << -2.0 * level << ' ' << plane(x, y) << '\n';
+      }
+    }
+  }
+  writeFile(dir.file("observations.txt"), obs.str());
+  p.projection = "'LOCAL'";
+  p.zRange = "0, 9";
+  p.spacing = "2";
+  p.searchRadius = "10000";
+  p.filterOperations = "0";
+  writeFile(dir.file("case.pfs"), p.render());
+}
+
+std::vector<int> statistics(const std::string& log) {
+  std::vector<int> counts;
+  for (const char* label : {"No. of bilinear interpolations          : ",
+                            "No. of distance weighted interpolations : ",
+                            "No. of no interpolations                : "}) {
+    const auto at = log.find(label);
+    if (at == std::string::npos) return {};
+    counts.push_back(std::stoi(log.substr(at + std::strlen(label))));
+  }
+  return counts;
+}
+
+TEST(BilinearRun, ReproducesALinearFieldInside) {
+  TempDir dir;
+  writePlaneCase(dir, ParameterFile{});
+  const ProcessResult r = runKarnet({"case.pfs"}, dir.path(), kQuiet);
+  const std::string log = readFile(dir.file("case.log"));
+  ASSERT_EQ(r.exitCode, 0) << log;
+  EXPECT_NE(log.find("-- Completion code : Successful"), std::string::npos);
+  // Every wet node of the 21 x 21 x 10 local grid that holds no cast is estimated once.
+  const auto counts = statistics(log);
+  ASSERT_EQ(counts.size(), 3u) << log;
+  EXPECT_EQ(counts[0] + counts[1] + counts[2], 10 * (21 * 21 - 36));
+  EXPECT_EQ(counts[2], 0);
+  EXPECT_NE(log.find("\n-------------------------------------------------\n"
+                     "Statistics for local grid:\n\n"),
+            std::string::npos);
+
+  int shape[3];
+  std::string item;
+  const std::vector<float> v = readResult(dir.file("result.nc"), &item, shape);
+  EXPECT_EQ(item, "Temperature");
+  ASSERT_EQ(shape[0], 10);
+  ASSERT_EQ(shape[1], 21);
+  ASSERT_EQ(shape[2], 21);
+  for (int l = 0; l < 10; ++l) {
+    for (int j = 1; j < 20; ++j) {
+      for (int i = 1; i < 20; ++i) {
+        const float value = v[(static_cast<std::size_t>(l) * 21 + j) * 21 + i];
+        ASSERT_NEAR(value, plane(1000.0 + 250.0 * i, 2000.0 + 250.0 * j), 1e-4)
+            << "node " << i << ", " << j << ", level " << l;
+      }
+    }
+  }
+}
+
+TEST(BilinearRun, ResultFileCarriesItsDescription) {
+  TempDir dir;
+  ParameterFile p;
+  p.itemType = "3";
+  writePlaneCase(dir, p);
+  ASSERT_EQ(runKarnet({"case.pfs"}, dir.path(), kQuiet).exitCode, 0);
+  int nc = 0;
+  ASSERT_EQ(nc_open(dir.file("result.nc").c_str(), NC_NOWRITE, &nc), NC_NOERR);
+  auto text = [nc](int var, const char* name) {
+    std::size_t len = 0;
+    if (nc_inq_attlen(nc, var, name, &len) != NC_NOERR) return std::string("<none>");
+    std::string value(len, '\0');
+    nc_get_att_text(nc, var, name, value.data());
+    return value;
+  };
+  for (const char* dim : {"time", "z", "y", "x"}) {
+    int id = 0;
+    EXPECT_EQ(nc_inq_dimid(nc, dim, &id), NC_NOERR) << dim;
+  }
+  int item = 0, crs = 0, z = 0;
+  ASSERT_EQ(nc_inq_varid(nc, "Salinity", &item), NC_NOERR);
+  EXPECT_EQ(text(item, "units"), "1e-3");
+  EXPECT_EQ(text(item, "standard_name"), "sea_water_salinity");
+  EXPECT_EQ(text(item, "grid_mapping"), "crs");
+  ASSERT_EQ(nc_inq_varid(nc, "crs", &crs), NC_NOERR);
+  EXPECT_EQ(text(crs, "projection"), "LOCAL");
+  EXPECT_EQ(text(NC_GLOBAL, "Conventions"), "CF-1.8");
+  EXPECT_EQ(text(NC_GLOBAL, "title"), "karnet test case");
+  float misc[7] = {};
+  std::size_t miscLength = 0;
+  ASSERT_EQ(nc_inq_attlen(nc, NC_GLOBAL, "Q84_Misc", &miscLength), NC_NOERR);
+  ASSERT_EQ(miscLength, 7u);
+  nc_get_att_float(nc, NC_GLOBAL, "Q84_Misc", misc);
+  EXPECT_EQ(misc[2], -900.0f);
+  ASSERT_EQ(nc_inq_varid(nc, "z", &z), NC_NOERR);
+  double levels[10];
+  ASSERT_EQ(nc_get_var_double(nc, z, levels), NC_NOERR);
+  EXPECT_DOUBLE_EQ(levels[1] - levels[0], 2.0);
+  nc_close(nc);
+}
+
+TEST(BilinearRun, ResultOpensInXarray) {
+  if (!fileExists("/usr/bin/python3")) GTEST_SKIP() << "no system python";
+  TempDir dir;
+  writePlaneCase(dir, ParameterFile{});
+  ASSERT_EQ(runKarnet({"case.pfs"}, dir.path(), kQuiet).exitCode, 0);
+  const ProcessResult py = runProgram(
+      "/usr/bin/python3",
+      {"-c",
+       "import xarray as xr\n"
+       "ds = xr.open_dataset('result.nc')\n"
+       "t = ds['Temperature']\n"
+       "print(t.dims, t.shape, t.attrs['units'], round(float(t.isel(time=0, z=0, y=10, x=10)), 3))\n"},
+      dir.path());
+  ASSERT_EQ(py.exitCode, 0) << py.err;
+  EXPECT_NE(py.out.find("('time', 'z', 'y', 'x') (1, 10, 21, 21) degree_Celsius 10.5"),
+            std::string::npos)
+      << py.out;
+}
+
+TEST(BilinearRun, FailedWriteIsAnErrorAndLeavesNoFile) {
+  TempDir dir;
+  ParameterFile p;
+  p.outputFileName = "|no/such/dir/result.nc|";
+  writePlaneCase(dir, p);
+  const ProcessResult r = runKarnet({"case.pfs"}, dir.path(), kQuiet);
+  EXPECT_EQ(r.exitCode, 1);
+  const std::string log = readFile(dir.file("case.log"));
+  EXPECT_NE(log.find("\nERROR while writing result file\n"), std::string::npos) << log;
+  EXPECT_NE(log.find("-- Completion code : Abnormal"), std::string::npos);
+  EXPECT_EQ(listDir(dir.path()).size(), 4u);  // the inputs and the log only
+}
+
+// A large case, so that a signal arrives while the run is computing.
+void writeLargeCase(const TempDir& dir) {
+  const int n = 1200;
+  BathymetrySpec b;
+  b.nx = n;
+  b.ny = n;
+  b.spacing = 50.0;
+  b.projection = "LOCAL";
+  b.heights.assign(static_cast<std::size_t>(n) * n, -60.0f);
+  writeBathymetry(dir.file("bathymetry.nc"), b);
+  std::ostringstream obs;
+  for (int j = 0; j < n; j += 150) {
+    for (int i = 0; i < n; i += 150) {
+      for (int level = 1; level <= 29; ++level) {
+        obs << 50.0 * i << ' ' << 50.0 * j << ' ' << -2.0 * level << ' ' << 5 + 0.1 * level << '\n';
+      }
+    }
+  }
+  writeFile(dir.file("observations.txt"), obs.str());
+  ParameterFile p;
+  p.projection = "'LOCAL'";
+  p.zRange = "0, 29";
+  p.spacing = "2";
+  p.searchRadius = "20000";
+  writeFile(dir.file("case.pfs"), p.render());
+}
+
+// Waits until the run has scanned its data, then sends the signal once.
+std::function<bool(int)> signalAfterScan(const TempDir& dir, int signal) {
+  return [&dir, signal](int pid) {
+    if (readFile(dir.file("case.log")).find("Number of z-nodes") == std::string::npos) {
+      return false;
+    }
+    kill(pid, signal);
+    return true;
+  };
+}
+
+TEST(BilinearRun, InterruptsEndTheRunWithTheSignalsCode) {
+  const std::vector<std::tuple<int, const char*>> interrupts = {
+      {SIGINT, "Control-C send"}, {SIGTERM, "Termination reques"}};
+  for (const auto& [signal, message] : interrupts) {
+    TempDir dir;
+    writeLargeCase(dir);
+    writeFile(dir.file("result.nc"), "an earlier result");
+    const ProcessResult r =
+        runKarnet({"case.pfs"}, dir.path(), kQuiet, signalAfterScan(dir, signal));
+    EXPECT_EQ(r.termSignal, 0);
+    EXPECT_EQ(r.exitCode, signal);
+    const std::string log = readFile(dir.file("case.log"));
+    EXPECT_NE(log.find(std::string(message) + "\n"), std::string::npos) << log;
+    EXPECT_NE(log.find("-- Completion code : Abnormal"), std::string::npos) << log;
+    // The earlier result is untouched and no partial file is left behind.
+    EXPECT_EQ(readFile(dir.file("result.nc")), "an earlier result");
+    EXPECT_EQ(listDir(dir.path()).size(), 5u);
+  }
+}
+
+TEST(BilinearRun, HostCancelEndsTheRunSuccessfullyWithoutResult) {
+  TempDir dir;
+  writeLargeCase(dir);
+  const ProcessResult r =
+      runKarnet({"//apv", "case.pfs"}, dir.path(), kQuiet, signalAfterScan(dir, SIGUSR1));
+  EXPECT_EQ(r.exitCode, 0);
+  const std::string log = readFile(dir.file("case.log"));
+  EXPECT_NE(log.find("Cancel computation"), std::string::npos) << log;
+  EXPECT_NE(log.find("-- Completion code : Successful"), std::string::npos) << log;
+  EXPECT_FALSE(fileExists(dir.file("result.nc")));
+}
+
+}  // namespace
+}  // namespace karnet::e2e

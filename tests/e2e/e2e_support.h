@@ -1,0 +1,119 @@
+#ifndef KARNET_TESTS_E2E_E2E_SUPPORT_H_
+#define KARNET_TESTS_E2E_E2E_SUPPORT_H_
+
+#include <functional>
+#include <map>
+#include <string>
+#include <vector>
+
+namespace karnet::e2e {
+
+// A directory under the system's temporary directory, removed with everything in it.
+class TempDir {
+ public:
+  TempDir();
+  ~TempDir();
+  TempDir(const TempDir&) = delete;
+  TempDir& operator=(const TempDir&) = delete;
+  const std::string& path() const { return path_; }
+  std::string file(const std::string& name) const { return path_ + "/" + name; }
+
+ private:
+  std::string path_;
+};
+
+struct ProcessResult {
+  int exitCode = -1;    // exit status when the process exited
+  int termSignal = 0;   // signal number when a signal killed it
+  std::string out;      // standard output
+  std::string err;      // standard error
+};
+
+// Runs program with args in directory cwd (standard input from /dev/null), with extra
+// environment variables set. While it runs, whileRunning (if given) is called every 20 ms with
+// the process id until it returns true. Gives up and kills the process after timeoutSeconds.
+ProcessResult runProgram(const std::string& program, const std::vector<std::string>& args,
+                         const std::string& cwd,
+                         const std::map<std::string, std::string>& env = {},
+                         const std::function<bool(int)>& whileRunning = {},
+                         int timeoutSeconds = 120);
+
+ProcessResult runKarnet(const std::vector<std::string>& args, const std::string& cwd,
+                        const std::map<std::string, std::string>& env = {},
+                        const std::function<bool(int)>& whileRunning = {});
+
+void writeFile(const std::string& path, const std::string& text);
+std::string readFile(const std::string& path);  // empty when missing
+bool fileExists(const std::string& path);
+std::vector<std::string> listDir(const std::string& path);
+std::vector<std::string> splitLines(const std::string& text);
+
+// The keywords of a parameter file, with values as they are written in the file.
+// Sections whose name is in `omit` are left out; `extra` lines go into INPUT_FILES.
+struct ParameterFile {
+  std::string dataFileName = "|observations.txt|";
+  std::string fileName = "|bathymetry.nc|";
+  std::string projection = "'UTM-32'";
+  std::string zRange = "0, 11";
+  std::string spacing = "2.5";
+  std::string searchRadius = "2500";
+  std::string maxExtrapolationDistance = "5, 10";
+  std::string analysis = "bilinear";
+  std::string zeroCrossingDistance = "2500";
+  std::string decayDistance = "1200";
+  std::string errorVariance = "10";
+  std::string minData = "-5";
+  std::string maxData = "40";
+  std::string filterOperations = "1";
+  std::string correlationSampleSize = "8";
+  std::string filterType = "'12 pts filter'";
+  std::string outputFileName = "|result.nc|";
+  std::string title = "'karnet test case'";
+  std::string itemType = "2";
+  std::vector<std::string> omit;
+
+  std::string render() const;
+};
+
+// A bathymetry made by karnet-mkgrid from an ESRI ASCII grid text; mkgridArgs are the options
+// that come before the input and output names. Returns the tool's result.
+ProcessResult makeBathymetry(const std::string& dir, const std::string& ascText,
+                             const std::vector<std::string>& mkgridArgs,
+                             const std::string& output = "bathymetry.nc");
+
+}  // namespace karnet::e2e
+
+
+namespace karnet::e2e {
+
+// A bathymetry file in the layout karnet reads, written directly with the NetCDF library.
+// heights holds nx * ny values, x fastest, row 0 at the origin (south-west).
+struct BathymetrySpec {
+  int nx = 0;
+  int ny = 0;
+  double spacing = 250.0;
+  std::vector<float> heights;
+  std::string projection = "UTM-32";
+  double originLongitude = 11.3;
+  double originLatitude = 55.2;
+  double orientation = 0.0;
+  float landValue = 10.0f;
+};
+void writeBathymetry(const std::string& path, const BathymetrySpec& spec);
+
+}  // namespace karnet::e2e
+
+namespace karnet::e2e {
+
+// A small complete case in dir: a 30 x 24 node basin of 250 m cells with a dry corner
+// (land value 10), in the LOCAL projection with its origin at (1000, 2000) and orientation 0,
+// and casts of a temperature that falls with depth and rises towards the east.
+// Returns the observation text it wrote.
+std::string writeSmallCase(const TempDir& dir, const ParameterFile& parameters);
+
+// Reads a result file's only item (time, z, y, x) as floats; shape gets (nz, ny, nx).
+std::vector<float> readResult(const std::string& path, std::string* itemName, int shape[3]);
+
+}  // namespace karnet::e2e
+
+#endif  // KARNET_TESTS_E2E_E2E_SUPPORT_H_
