@@ -2,6 +2,7 @@
 #include "analysis/select_data.h"
 
 #include <algorithm>
+#include <cmath>
 #include <utility>
 
 #include "analysis/correlation.h"
@@ -15,16 +16,22 @@ float searchRadius2(const RunSettings& settings) {
   return settings.SearchRadius * settings.SearchRadius / settings.dx / settings.dx;
 }
 
-// Largest whole-node offset o in 0..maxOffset whose square (as a float, the way
-// the distance test forms it) does not exceed r2. A cell further than that in
-// x alone, or in y alone, fails the radius test whatever its other offset.
-std::int32_t reachInNodes(float r2, std::int32_t maxOffset) {
-  std::int32_t o = 0;
-  while (o < maxOffset) {
-    const float next = static_cast<float>(o + 1);
-    if (next * next > r2) break;
-    ++o;
-  }
+// Largest whole-node offset o whose square, formed as a float the way the
+// distance test forms it, does not exceed r2; kUnbounded when that is not a
+// usable bound (an infinite or not-a-number radius). A cell further than o in x
+// alone, or in y alone, fails the radius test whatever its other offset.
+constexpr std::int64_t kUnbounded = std::int64_t{1} << 24;
+
+std::int64_t reachInNodes(float r2) {
+  if (!(r2 < static_cast<float>(kUnbounded) * static_cast<float>(kUnbounded))) return kUnbounded;
+  if (!(r2 >= 0.0f)) return -1;  // nothing passes a negative radius
+  auto o = static_cast<std::int64_t>(std::sqrt(static_cast<double>(r2)));
+  auto square = [](std::int64_t v) {
+    const auto f = static_cast<float>(v);
+    return f * f;
+  };
+  while (o > 0 && square(o) > r2) --o;
+  while (o + 1 < kUnbounded && !(square(o + 1) > r2)) ++o;
   return o;
 }
 
@@ -78,17 +85,22 @@ std::int32_t selectData(OaWorkspace& ws, std::int32_t j, std::int32_t k,
     // rows, that the radius can reach are visited, in collection order. Cells
     // outside that window would fail the radius test anyway.
     const std::int32_t nj = ws.columnCount;
-    const std::int32_t reach = reachInNodes(radius2, nj - 1);
+    const std::int64_t reach = reachInNodes(radius2);
     const std::int64_t xFirst = std::max<std::int64_t>(std::int64_t{j} - reach, 0);
     const std::int64_t xLast = std::min<std::int64_t>(std::int64_t{j} + reach, nj - 1);
-    const float yFirst = static_cast<float>(std::int64_t{k} - reach);
+    const bool windowY = reach < kUnbounded;
+    const double yFirst = static_cast<double>(std::int64_t{k} - reach);
+    const double yLast = static_cast<double>(std::int64_t{k} + reach);
     for (std::int64_t x = xFirst; x <= xLast; ++x) {
-      const std::int32_t begin = ws.columnStart[x];
+      std::int32_t i = ws.columnStart[x];
       const std::int32_t end = ws.columnStart[x + 1];
-      const float* first = std::lower_bound(ws.dataY + begin, ws.dataY + end, yFirst);
-      const auto yLast = static_cast<float>(std::int64_t{k} + reach);
-      for (auto i = static_cast<std::int32_t>(first - ws.dataY); i < end && ws.dataY[i] <= yLast;
-           ++i) {
+      if (windowY) {
+        const float* first = std::lower_bound(
+            ws.dataY + i, ws.dataY + end, yFirst,
+            [](float y, double bound) { return static_cast<double>(y) < bound; });
+        i = static_cast<std::int32_t>(first - ws.dataY);
+      }
+      for (; i < end && !(windowY && static_cast<double>(ws.dataY[i]) > yLast); ++i) {
         consider(ws, i, nodeX, nodeY, radius2, count);
       }
     }

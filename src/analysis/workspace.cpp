@@ -91,7 +91,8 @@ void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::i
 void workspaceIndexColumns(OaWorkspace& ws, std::int32_t nj) {
   release(ws.columnStart);
   ws.columnCount = 0;
-  if (nj < 1) return;
+  // Positions must stay exact as floats for the column window of the selection.
+  if (nj < 1 || nj >= (1 << 24)) return;
 
   // Column order means: whole-node positions inside the layer, x never
   // decreasing, and y strictly increasing within a column.

@@ -1,1 +1,108 @@
-int main() { return 1; }
+// karnet: grids scattered 3-D ocean observations over a bathymetry.
+//
+// The entry records the run mode in H84, then either runs the computation under
+// the progress host (argument "//apv") or directly. The run never comes back
+// here: it ends the process through the exit path of the run control.
+#include <strings.h>
+
+#include <cstdio>
+#include <cstdlib>
+
+#include "control/command_line.h"
+#include "control/host.h"
+#include "control/log.h"
+#include "control/run_driver.h"
+#include "control/termination.h"
+#include "params/run_setup.h"
+
+namespace {
+
+constexpr char kUsage[] = "Usage: karnet.exe [//apv] [options] pfs-file";
+
+constexpr char kHelp[] =
+    "\n"
+    "Grids scattered 3-D observations (x y z value per line, projected map\n"
+    "coordinates) onto a regular 3-D grid over a bathymetry and writes it as a\n"
+    "NetCDF result file. The log is written beside the parameter file, with the\n"
+    "extension .log. Exit code 0: complete or cancelled; 1: error.\n"
+    "\n"
+    "Options:\n"
+    "  //apv      run under the progress display; q or SIGUSR1 cancels the run\n"
+    "  -debug     accepted, without effect\n"
+    "  --help     this text\n"
+    "  --version  the program's version\n"
+    "\n"
+    "The parameter file holds the target [Q4_DIGITIZING_OF_DATA] with five sections:\n"
+    "  [INPUT_FILES]          DataFileName = |observations|, FileName = |bathymetry.nc|,\n"
+    "                         Projection = 'UTM-32' (or LOCAL, EPSG:code, PROJ text)\n"
+    "  [DESCRIPTION_OF_GRID]  ZRange = first, last level; Spacing = level spacing [m]\n"
+    "  [CALCULATION_PARAMETERS]\n"
+    "                         SearchRadius, MaxExtrapolationDistance = up, down,\n"
+    "                         Analysis = 'bilinear' (any other text: objective analysis)\n"
+    "  [OBJECTIVE_ANALYSIS_PARAMETERS]\n"
+    "                         ZeroCrossingDistance, DecayDistance, ErrorVariance,\n"
+    "                         MinData, MaxData, FilterOperations, CorrelationSampleSize,\n"
+    "                         FilterType = '12 pts filter' (any other text: Shapiro)\n"
+    "  [OUTPUT_DATA]          FileName = |result.nc|, Title = 'text', ItemType = number\n"
+    "Each section closes with EndSect; // starts a comment. All keywords are required.\n";
+
+// Kept for the host's callback, which takes no arguments.
+int argumentCount = 0;
+char** argumentVector = nullptr;
+
+// Picks the parameter file, opens the log beside it, sets the run up and runs it.
+[[noreturn]] void runMain(int count, char** arguments) {
+  char parameterFile[karnet::kFileNameSize];
+  if (karnet::selectParameterFile(count, arguments, parameterFile) == 0) {
+    karnet::fatalError(kUsage);
+  }
+
+  char logFileName[karnet::kFileNameSize];
+  std::FILE* log = nullptr;
+  if (karnet::makeLogFileName(parameterFile, logFileName) != 0) {
+    log = std::fopen(logFileName, "w");
+  }
+  karnet::logSetStream(log != nullptr ? log : stderr);
+
+  karnet::setupRun(parameterFile);
+  karnet::runDriver();
+}
+
+int hostEntry() { runMain(argumentCount, argumentVector); }
+
+// --help and --version answer on stdout and leave without a log.
+bool answerInformationRequest(int count, char** arguments) {
+  for (int i = 0; i < count; ++i) {
+    if (strcasecmp(arguments[i], "--help") == 0) {
+      std::printf("%s\n%s", kUsage, kHelp);
+      return true;
+    }
+    if (strcasecmp(arguments[i], "--version") == 0) {
+      std::printf("karnet %s\n", KARNET_VERSION);
+      return true;
+    }
+  }
+  return false;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  // The platform hands the arguments already split; the program's own name is
+  // not one of them.
+  argumentCount = argc > 0 ? argc - 1 : 0;
+  argumentVector = argc > 0 ? argv + 1 : argv;
+
+  const bool hostMode = karnet::hasHostModeArgument(argumentCount, argumentVector);
+  setenv("H84", hostMode ? "APV" : "WIN", 1);
+
+  if (answerInformationRequest(argumentCount, argumentVector)) return 0;
+
+  if (hostMode) {
+    char programName[karnet::kFileNameSize] = "";
+    karnet::moduleBaseName(programName, sizeof programName);
+    karnet::apvStart(programName, hostEntry);
+    return 0;
+  }
+  runMain(argumentCount, argumentVector);
+}

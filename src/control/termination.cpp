@@ -27,12 +27,18 @@ bool environmentEquals(const char* name, const char* value) {
   return actual != nullptr && strcasecmp(actual, value) == 0;
 }
 
-// Writes the report, closes the log and restores the terminal. A second
-// caller (a signal arriving while the run already ends) finds nothing to do.
-void finishRun(std::int32_t exitCode) {
+// Writes the report, closes the log and restores the terminal. Inside a
+// signal handler the log is only flushed: closing it would free its buffer,
+// and the interrupted code may hold the heap's lock.
+void finishRun(std::int32_t exitCode, bool inSignal) {
   endingStarted = 1;
   runTimeReport(exitCode);
-  logClose();
+  if (inSignal) {
+    if (logStream != nullptr) std::fflush(logStream);
+    logStream = nullptr;
+  } else {
+    logClose();
+  }
   apvShutdown();
 }
 
@@ -66,7 +72,7 @@ bool runEnding() { return endingStarted != 0; }
 
 void exitRun(std::int32_t exitCode) {
   if (endingStarted != 0) std::_Exit(exitCode);
-  finishRun(exitCode);
+  finishRun(exitCode, false);
   std::exit(exitCode);
 }
 
@@ -75,7 +81,7 @@ void fatalError(const char* message, const std::int32_t* exitCode) {
   if (endingStarted != 0) std::_Exit(code);
   endingStarted = 1;
   reportFatal(message);
-  finishRun(code);
+  finishRun(code, false);
   std::exit(code);
 }
 
@@ -83,7 +89,7 @@ void fatalErrorInSignal(const char* message, std::int32_t exitCode) {
   if (endingStarted == 0) {
     endingStarted = 1;
     reportFatal(message);
-    finishRun(exitCode);
+    finishRun(exitCode, true);
   }
   std::fflush(stderr);
   _exit(exitCode);
@@ -94,20 +100,8 @@ int showMessage(const char* text) {
   moduleBaseName(caption, sizeof caption);
   if (text == nullptr) text = "";
   if (environmentEquals("H84", "apv")) return apvMessage(text, caption, kErrorStyle);
-
-  // On a terminal the message box becomes one line; the newlines that frame
-  // some messages in the log are left out of it. It never waits for a key.
-  std::size_t begin = 0;
-  std::size_t end = std::strlen(text);
-  while (begin < end && (text[begin] == '\n' || text[begin] == '\r')) ++begin;
-  while (end > begin && (text[end - 1] == '\n' || text[end - 1] == '\r')) --end;
-  const int length = static_cast<int>(end - begin);
-  if (caption[0] != '\0') {
-    std::fprintf(stderr, "%s: %.*s\n", caption, length, text + begin);
-  } else {
-    std::fprintf(stderr, "%.*s\n", length, text + begin);
-  }
-  std::fflush(stderr);
+  // The message box of a terminal: one line on stderr that never waits for a key.
+  consoleMessage(text, caption);
   return 1;
 }
 
@@ -117,6 +111,14 @@ void moduleBaseName(char* buffer, std::size_t size) {
   const ssize_t length = readlink("/proc/self/exe", path, sizeof path - 1);
   if (length <= 0) return;
   path[length] = '\0';
+  // A program file replaced while it runs is reported with this suffix.
+  constexpr char kDeleted[] = " (deleted)";
+  constexpr std::size_t kDeletedLength = sizeof kDeleted - 1;
+  const auto pathLength = static_cast<std::size_t>(length);
+  if (pathLength > kDeletedLength &&
+      std::strcmp(path + pathLength - kDeletedLength, kDeleted) == 0) {
+    path[pathLength - kDeletedLength] = '\0';
+  }
   const char* slash = std::strrchr(path, '/');
   const char* name = slash != nullptr ? slash + 1 : path;
   std::size_t nameLength = std::strlen(name);

@@ -53,17 +53,26 @@ int grdSetItemInfo(GrdHeader* header, GrdItem* item, std::int32_t itemType, cons
 int grdSetItemAxisEqD3(GrdItem* item, int axisUnit, std::int32_t nx, std::int32_t ny,
                        std::int32_t nz, float x0, float y0, float z0, float dx, float dy,
                        float dz);
+// The 2-D form (an item on y and x only, as in a bathymetry file).
+int grdSetItemAxisEqD2(GrdItem* item, int axisUnit, std::int32_t nx, std::int32_t ny, float x0,
+                       float y0, float dx, float dy);
 int grdAddCustomBlock(GrdHeader* header, int type, const char* name, std::int32_t count,
                       const float* values);
 int grdSetGeoInfoUTMProj(GrdHeader* header, const char* projection, double longitude,
                          double latitude, double orientation);
-// Creates the file under a temporary name beside fileName.
+// Creates the file. Its contents are assembled away from fileName; nothing
+// appears under fileName before grdFileClose, and an earlier file of that name
+// stays as it is until then.
 int grdFileCreate(const char* fileName, GrdHeader* header, GrdFile** file);
 int grdWriteItemTimeStep(GrdHeader* header, GrdFile* file, double time, const float* data);
 // Closes the file; a complete file is renamed to its final name. Sets *file to null.
 int grdFileClose(GrdHeader* header, GrdFile** file);
 // Drops a file that was created but must not appear (temporary file removed).
 int grdFileAbandon(GrdHeader* header, GrdFile** file);
+
+// Removes any temporary file that a close is about to rename. Safe to call
+// from a signal handler; also run at exit.
+void grdRemoveTemporaryFiles();
 
 }  // namespace karnet
 

@@ -78,12 +78,14 @@ struct Cartography::Impl {
   PJ_CONTEXT* context = nullptr;
   PJ* crs = nullptr;        // the projected CRS; null for LOCAL
   PJ* transform = nullptr;  // geographic (lon, lat degrees) -> projected (east, north)
+  PJ* factors = nullptr;    // the projection as a plain PROJ operation, for proj_factors
   bool local = false;
   double longitude = 0.0;
   double latitude = 0.0;
   double orientation = 0.0;
 
   ~Impl() {
+    if (factors != nullptr) proj_destroy(factors);
     if (transform != nullptr) proj_destroy(transform);
     if (crs != nullptr) proj_destroy(crs);
     if (context != nullptr) proj_context_destroy(context);
@@ -144,6 +146,17 @@ void Cartography::Impl::open(const std::string& text) {
   transform = proj_normalize_for_visualization(context, operation);
   proj_destroy(operation);
   owned(transform, "conversion cannot be normalised");
+
+  // proj_factors on a CRS object takes the CRS's axis order into account only
+  // partly (a northing-first CRS gives nonsense), while on the classic
+  // operation of its PROJ string it is exact. CRSs without a PROJ string form
+  // fall back to the CRS object itself.
+  if (const char* definitionText = proj_as_proj_string(context, crs, PJ_PROJ_5, nullptr)) {
+    std::string operation = definitionText;
+    const std::size_t at = operation.find(" +type=crs");
+    if (at != std::string::npos) operation.erase(at, 10);
+    factors = proj_create(context, operation.c_str());
+  }
 }
 
 Cartography::Cartography(const std::string& projection, double longitude, double latitude,
@@ -189,12 +202,15 @@ void Cartography::projToGeo(double x, double y, double* longitude, double* latit
 
 double Cartography::convergence(double longitude, double latitude) const {
   if (impl_->local) return 0.0;
-  PJ_FACTORS factors =
-      proj_factors(impl_->crs, proj_coord(longitude * kDegree, latitude * kDegree, 0, 0));
-  if (proj_errno(impl_->crs) != 0) {
-    proj_errno_reset(impl_->crs);
-    return std::numeric_limits<double>::quiet_NaN();
-  }
+  // proj_factors wants radians, longitude from the base CRS's prime meridian,
+  // as the longitudes of this class are.
+  PJ* projection = impl_->factors != nullptr ? impl_->factors : impl_->crs;
+  proj_errno_reset(projection);
+  const PJ_FACTORS factors = proj_factors(
+      projection, proj_coord(longitude * kDegree, latitude * kDegree, 0, 0));
+  const bool failed = proj_errno(projection) != 0;
+  proj_errno_reset(projection);
+  if (failed) return std::numeric_limits<double>::quiet_NaN();
   return factors.meridian_convergence / kDegree;
 }
 

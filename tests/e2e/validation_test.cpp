@@ -51,13 +51,13 @@ TEST(Validation, EachRefusalHasItsMessageAndExitCode1) {
        "ERROR: in calculation parameters"},
       {"zero decay with objective analysis",
        [](ParameterFile& p) {
-         p.analysis = "0";
+         p.analysis = "objective";
          p.decayDistance = "0";
        },
        {}, "ERROR: in calculation parameters"},
       {"zero crossing 0 with objective analysis",
        [](ParameterFile& p) {
-         p.analysis = "0";
+         p.analysis = "objective";
          p.zeroCrossingDistance = "0";
        },
        {}, "ERROR: in calculation parameters"},

@@ -1,0 +1,32 @@
+#ifndef KARNET_ANALYSIS_OBJAN_H_
+#define KARNET_ANALYSIS_OBJAN_H_
+
+#include <cstdint>
+
+#include "analysis/workspace.h"
+#include "params/run_settings.h"
+
+namespace karnet {
+
+// Optimal-interpolation estimate from the m cells chosen by selectData
+// (ws.selX, selY, selValue, selCorr): mu + rho' A^-1 (d - mu), where A is the
+// cells' correlation matrix with the error term on its diagonal and mu the
+// A^-1-weighted mean of the values d. Returns 0 and writes *estimate on
+// success; returns -1 and leaves *estimate alone on failure, with ws.errorText
+// naming the reason. ws.selValue is left with the mean removed.
+std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSettings& settings);
+
+// Fills the top-left m x m block of ws.matrix with the correlations among the
+// chosen cells, adds ErrorVariance / 100 on the diagonal and inverts the block
+// in place with INVMTX. Returns 0, or -1 when the inversion fails.
+std::int32_t buildCorrelationMatrix(OaWorkspace& ws, std::int32_t m, const RunSettings& settings);
+
+// With a the inverted matrix (row stride ws.limit): mean = (sum of a's
+// row products with values) / (sum of all of a's n x n entries); subtracts the
+// mean from values[0..n-1] in place and hands back the mean and the entry sum.
+void removeWeightedMean(const OaWorkspace& ws, const float* a, float* values, std::int32_t n,
+                        float& mean, float& weightSum);
+
+}  // namespace karnet
+
+#endif  // KARNET_ANALYSIS_OBJAN_H_

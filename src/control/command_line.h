@@ -1,0 +1,31 @@
+#ifndef KARNET_CONTROL_COMMAND_LINE_H_
+#define KARNET_CONTROL_COMMAND_LINE_H_
+
+#include <cstddef>
+
+namespace karnet {
+
+// Size of the parameter-file and log-file name buffers, terminator included.
+inline constexpr std::size_t kFileNameSize = 260;
+
+// The arguments are those after the program's own name, in their order.
+
+// True when some argument equals "//apv" (any case): the run goes under the
+// progress host.
+bool hasHostModeArgument(int count, const char* const* arguments);
+
+// Copies the last argument that is not "//apv", "-debug" or empty (any case)
+// into name (kFileNameSize characters, always terminated; empty when there is
+// none). Returns 1 when that name is also the last argument, as the usage
+// requires, else 0. A name that does not fit the buffer is not the last
+// argument and gives 0.
+int selectParameterFile(int count, const char* const* arguments, char* name);
+
+// The parameter file's path with its extension replaced by ".log" (added when
+// it has none), so that the log lies beside the parameter file. Returns 0 and
+// leaves output empty when the result does not fit kFileNameSize characters.
+int makeLogFileName(const char* parameterFile, char* output);
+
+}  // namespace karnet
+
+#endif  // KARNET_CONTROL_COMMAND_LINE_H_

@@ -1,0 +1,73 @@
+// Laying the basic grid over the data and the local grid, one axis at a time.
+#include <gtest/gtest.h>
+
+#include "input/data_scan.h"
+
+namespace karnet {
+namespace {
+
+TEST(BasicAxis, DataBelowTheLocalOriginExtendTheGridDownwards) {
+  // Local first node at 100, spacing 10, local nodes 0..10; data from 75 to 260.
+  const BasicAxis a = layBasicAxis(75.0, 260.0, 100.0, 10.0f, 0, 10);
+  EXPECT_DOUBLE_EQ(a.origin, 70.0);
+  EXPECT_EQ(a.offset, 3);
+  EXPECT_EQ(a.count, 21);
+  EXPECT_FALSE(a.originWarning);
+  // An observation at 75 lies half a node above the origin, one at 260 on node 19.
+  EXPECT_DOUBLE_EQ((75.0 - a.origin) / 10.0, 0.5);
+  EXPECT_DOUBLE_EQ((260.0 - a.origin) / 10.0, 19.0);
+}
+
+TEST(BasicAxis, LevelsBelowTheDeepestLocalLevel) {
+  // Levels 0..9 of 1 m: the deepest local level lies at -10; data reach -14.2 and the surface.
+  const BasicAxis z = layBasicAxis(-14.2, 0.0, -10.0, 1.0f, 0, 9);
+  EXPECT_DOUBLE_EQ(z.origin, -15.0);
+  EXPECT_EQ(z.offset, 5);
+  EXPECT_EQ(z.count, 17);
+  EXPECT_FALSE(z.originWarning);
+}
+
+TEST(BasicAxis, DataAtOrAboveTheLocalOriginKeepIt) {
+  const BasicAxis same = layBasicAxis(100.0, 150.0, 100.0, 10.0f, 0, 10);
+  EXPECT_DOUBLE_EQ(same.origin, 100.0);
+  EXPECT_EQ(same.offset, 0);
+  EXPECT_FALSE(same.originWarning);
+  const BasicAxis above = layBasicAxis(130.0, 150.0, 100.0, 10.0f, 0, 10);
+  EXPECT_DOUBLE_EQ(above.origin, 100.0);
+  EXPECT_EQ(above.offset, 0);
+  EXPECT_TRUE(above.originWarning);
+  // The local grid alone decides the size when the data end before it does.
+  EXPECT_EQ(above.count, 12);
+}
+
+TEST(BasicAxis, TheLocalGridAlwaysFitsWithOneNodeToSpare) {
+  // Spacings that are not powers of two round in float; the rule must still hold.
+  for (float spacing : {0.3f, 1.0f, 2.5f, 7.1f, 250.0f}) {
+    for (double dataMin : {-1000.0, -3.3, 0.0, 12.0}) {
+      for (double dataMax : {-2.0, 40.0, 5000.0}) {
+        for (int span : {0, 1, 9, 40}) {
+          SCOPED_TRACE(testing::Message() << spacing << " " << dataMin << " " << dataMax
+                                          << " " << span);
+          const double localFirst = 11.0;
+          const BasicAxis a = layBasicAxis(dataMin, dataMax, localFirst, spacing, 3, 3 + span);
+          EXPECT_GE(a.count, a.offset + span + 2);
+          EXPECT_GE(a.offset, 0);
+          EXPECT_LE(a.origin, localFirst);
+          if (dataMin < localFirst) {
+            EXPECT_LT(a.origin, dataMin);
+            EXPECT_GE(a.origin, dataMin - spacing * 1.000001);
+          }
+        }
+      }
+    }
+  }
+}
+
+TEST(BasicAxis, HugeExtentsGiveCountsBeyondThirtyTwoBits) {
+  // The caller refuses such a grid; the count itself must not wrap.
+  const BasicAxis a = layBasicAxis(0.0, 1e12, 0.0, 1.0f, 0, 10);
+  EXPECT_GT(a.count, std::int64_t{2147483647});
+}
+
+}  // namespace
+}  // namespace karnet
