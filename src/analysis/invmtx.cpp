@@ -32,26 +32,35 @@ std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
   det = 1.0f;
   std::int32_t scale = 0;
 
+  // The indices not yet used as pivots, ascending; a free column is also a
+  // free row, as each pivot is moved onto the diagonal.
+  std::int32_t* free = ws.pivot + 2 * std::int64_t{n};
+  std::int32_t freeCount = n;
+  for (std::int32_t i = 0; i < n; ++i) free[i] = i;
+
   for (std::int32_t s = 0; s < n; ++s) {
-    // Pivot search, columns outer, rows inner. ">=" lets the last of equal
-    // magnitudes win. Should every free entry be not-a-number the first free
-    // column and row stand as the pivot.
-    std::int32_t pivotRow = -1;
-    std::int32_t pivotCol = -1;
+    // Pivot search. The scan runs over columns (outer) and rows (inner) of the
+    // free entries and takes the entry of greatest magnitude, ">=" letting the
+    // last of equal magnitudes win: that is the equal-magnitude entry with the
+    // greatest column, and within it the greatest row. Here the free entries
+    // are visited row by row, along memory, with that tie rule made explicit.
+    // A not-a-number never wins; should every free entry be one, the first
+    // free column and row stand as the pivot.
+    std::int32_t pivotRow = free[0];
+    std::int32_t pivotCol = free[0];
     float largest = 0.0f;
-    for (std::int32_t b = 0; b < n; ++b) {
-      if (used[b] != -1) continue;
-      for (std::int32_t r = 0; r < n; ++r) {
-        if (used[r] != -1) continue;
-        if (pivotRow < 0) {
-          pivotRow = r;
-          pivotCol = b;
-        }
-        const float magnitude = std::fabs(at(r, b));
-        if (magnitude >= largest) {
+    bool found = false;
+    for (std::int32_t ri = 0; ri < freeCount; ++ri) {
+      const std::int32_t r = free[ri];
+      const float* row = &at(r, 0);
+      for (std::int32_t ci = 0; ci < freeCount; ++ci) {
+        const std::int32_t b = free[ci];
+        const float magnitude = std::fabs(row[b]);
+        if (magnitude > largest || (magnitude == largest && (!found || b >= pivotCol))) {
           largest = magnitude;
           pivotRow = r;
           pivotCol = b;
+          found = true;
         }
       }
     }
@@ -59,6 +68,11 @@ std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
     const std::int32_t pc = pivotCol;
     used[pc] = pr;
     order[s] = pc;
+    std::int32_t kept = 0;
+    for (std::int32_t i = 0; i < freeCount; ++i) {
+      if (free[i] != pc) free[kept++] = free[i];
+    }
+    freeCount = kept;
     const float p = at(pr, pc);
 
     det = det * p;

@@ -16,7 +16,9 @@ namespace karnet {
 //   "Determinant too large in INVMTX"  scaled down by ten 76 times or more
 //                                      (det then holds that count)
 // "Determinant very small in INVMTX" (final determinant below 1e-4) is set on
-// success. det receives the determinant. The pivot indices live in ws.pivot.
+// success. det receives the determinant. The pivot records live in ws.pivot: entry c
+// is the row in which column c's pivot was found, entry n + s the pivot column
+// of step s.
 std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det);
 
 }  // namespace karnet

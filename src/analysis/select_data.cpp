@@ -3,7 +3,6 @@
 
 #include <algorithm>
 #include <cmath>
-#include <utility>
 
 #include "analysis/correlation.h"
 
@@ -51,25 +50,29 @@ inline void consider(OaWorkspace& ws, std::int32_t i, float nodeX, float nodeY, 
 }  // namespace
 
 void sortByCorrelation(float* corr, std::int32_t* index, std::int32_t n) {
+  // The exchange sort repeats passes over the pairs (i, i + gap) until no pair
+  // is out of order, for gaps n/2, n/4, ..., 1. Pairs of one gap only ever join
+  // entries of the same residue class modulo the gap, and within a class each
+  // exchange swaps neighbours that are strictly out of order: equal values
+  // never pass each other, and a not-a-number (which compares with nothing)
+  // never moves and is never passed. So each gap's pass series leaves every
+  // class in the one order a stable descending sort gives, with any
+  // not-a-number as a fixed barrier. A gapped insertion sort with the same
+  // strict comparison reaches that very order without the repeated passes.
   if (n < 2) return;
-  std::int32_t gap = n / 2;
-  for (;;) {
-    bool exchanged = true;
-    while (exchanged) {
-      exchanged = false;
-      for (std::int32_t i = 0; i < n - gap; ++i) {
-        // Only a smaller value moves back: equal values, and a not-a-number
-        // (which compares with nothing), stay where they are, so every pass
-        // series ends.
-        if (corr[i] < corr[i + gap]) {
-          std::swap(corr[i], corr[i + gap]);
-          std::swap(index[i], index[i + gap]);
-          exchanged = true;
-        }
+  for (std::int32_t gap = n / 2; gap >= 1; gap /= 2) {
+    for (std::int32_t i = gap; i < n; ++i) {
+      const float value = corr[i];
+      const std::int32_t moving = index[i];
+      std::int32_t p = i;
+      while (p >= gap && corr[p - gap] < value) {
+        corr[p] = corr[p - gap];
+        index[p] = index[p - gap];
+        p -= gap;
       }
+      corr[p] = value;
+      index[p] = moving;
     }
-    if (gap <= 1) break;
-    gap /= 2;
   }
 }
 

@@ -43,8 +43,8 @@ struct OaWorkspace {
   std::int32_t lineCapacity = 0;
   float* lineBuffer = nullptr;
 
-  // The 2 * limit pivot indices of the matrix inversion, kept here so that no
-  // estimate allocates.
+  // 3 * limit indices of the matrix inversion (pivot records and the list of
+  // free indices), kept here so that no estimate allocates.
   std::int32_t* pivot = nullptr;
 
   // correlation(d2) for the integral squared distances d2 = 0 .. corrTableSize-1.

@@ -47,6 +47,7 @@ struct Display {
   int speed = 0;
   int lastTenth = -1;              // tenth of the work of the last plain report line
   bool tenthPending = false;
+  bool percentChanged = false;     // the shown line lags behind the percentage
   std::int64_t lastDrawNs = 0;
 };
 
@@ -118,6 +119,7 @@ void drawLine(bool force) {
   const std::int64_t now = monotonicNs();
   if (!force && display.lineShown != 0 && now - display.lastDrawNs < kRedrawIntervalNs) return;
   display.lastDrawNs = now;
+  display.percentChanged = false;
 
   char line[512];
   int length = std::snprintf(line, sizeof line, "%s", display.status);
@@ -157,8 +159,7 @@ void flushTenthLine() {
   if (display.tenthPending) writeTenthLine();
 }
 
-// Called on every change of a shown value.
-void showChange(bool force) {
+void redraw(bool force) {
   if (terminalDisplay()) drawLine(force);
 }
 
@@ -244,6 +245,7 @@ bool quitKeyPressed() {
 
 int apvStart(const char* /*programName*/, int (*callback)()) {
   display.hostMode = true;
+  display.terminalChecked = false;
   cancelSignalled = 0;
   struct sigaction action {};
   action.sa_handler = cancelSignalHandler;
@@ -263,6 +265,8 @@ int apvStart(const char* /*programName*/, int (*callback)()) {
 
 int apvStatus(const char* text) {
   flushTenthLine();
+  // Where the display goes is looked at anew with each phase.
+  display.terminalChecked = false;
   std::snprintf(display.status, sizeof display.status, "%s", text != nullptr ? text : "");
   display.percent = -1;
   display.lastTenth = -1;
@@ -270,36 +274,36 @@ int apvStatus(const char* text) {
     writeText(display.status);
     writeAll("\n", 1);
   }
-  showChange(true);
+  redraw(true);
   return 0;
 }
 
+// A report comes as percentage, time left and speed, in this order; the line
+// is drawn once the speed has arrived, so that it shows one report's values.
 int apvProgress(int percent) {
   flushTenthLine();
-  const bool changed = percent != display.percent;
+  if (percent != display.percent) display.percentChanged = true;
   display.percent = percent;
   if (plainLines()) {
     const int tenth = std::clamp(percent, 0, 100) / 10;
     if (tenth != display.lastTenth) {
       display.lastTenth = tenth;
-      // Written once the time left and the speed of this report are known.
       display.tenthPending = true;
     }
   }
-  showChange(changed);
   return 0;
 }
 
 int apvTimeLeft(int seconds) {
   display.timeLeft = seconds;
-  showChange(false);
   return 0;
 }
 
 int apvSpeed(int unitsPerSecond) {
   display.speed = unitsPerSecond;
   flushTenthLine();
-  showChange(false);
+  // A new percentage is shown at once, other changes at most every 0.1 s.
+  redraw(display.percentChanged);
   return 0;
 }
 

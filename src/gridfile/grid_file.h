@@ -38,7 +38,8 @@ int grdGetItemStatsGlobal(GrdItem* item, double* minimum, double* maximum, doubl
 int grdFindBlockDynamic(GrdHeader* header, GrdFile* file);
 // Reads the next time step of item 1 into data (nx*ny[*nz] floats, x fastest).
 int grdReadItemTimeStep(GrdHeader* header, GrdFile* file, double* time, float* data);
-// Destroys the header (and closes a file opened for reading with it); sets *header to null.
+// Destroys the header (and closes a file opened for reading with it, or drops
+// a file still being written); sets *header to null.
 void grdHeaderDestroy(GrdHeader** header);
 
 // ---- writing ----
@@ -60,14 +61,15 @@ int grdAddCustomBlock(GrdHeader* header, int type, const char* name, std::int32_
                       const float* values);
 int grdSetGeoInfoUTMProj(GrdHeader* header, const char* projection, double longitude,
                          double latitude, double orientation);
-// Creates the file. Its contents are assembled away from fileName; nothing
-// appears under fileName before grdFileClose, and an earlier file of that name
-// stays as it is until then.
+// Creates the file once every item has its info and axis. Its contents are
+// assembled in memory: nothing appears under fileName before grdFileClose, and
+// an earlier file of that name stays as it is until then. Without
+// grdSetEqTimeAxis the file has no time dimension and takes one step.
 int grdFileCreate(const char* fileName, GrdHeader* header, GrdFile** file);
 int grdWriteItemTimeStep(GrdHeader* header, GrdFile* file, double time, const float* data);
 // Closes the file; a complete file is renamed to its final name. Sets *file to null.
 int grdFileClose(GrdHeader* header, GrdFile** file);
-// Drops a file that was created but must not appear (temporary file removed).
+// Drops a file that was created but must not appear; nothing of it reaches the disk.
 int grdFileAbandon(GrdHeader* header, GrdFile** file);
 
 // Removes any temporary file that a close is about to rename. Safe to call

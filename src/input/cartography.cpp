@@ -91,7 +91,7 @@ struct Cartography::Impl {
     if (context != nullptr) proj_context_destroy(context);
   }
 
-  // Takes ownership of object; throws when it is null.
+  // object itself; throws when PROJ gave none.
   PJ* owned(PJ* object, const char* what) {
     if (object == nullptr) throw std::runtime_error(what);
     return object;
@@ -117,17 +117,17 @@ void Cartography::Impl::open(const std::string& text) {
   proj_context_set_enable_network(context, 0);
 
   PJ* object = owned(proj_create(context, definition.c_str()), "projection not recognised");
-  // A bound CRS (+towgs84) or a compound CRS (with heights) carries the
-  // projected CRS inside.
-  if (proj_get_type(object) == PJ_TYPE_BOUND_CRS) {
-    PJ* inner = proj_get_source_crs(context, object);
-    proj_destroy(object);
-    object = owned(inner, "bound CRS without source");
-  }
+  // A compound CRS (with heights) carries the horizontal CRS first; that or
+  // the CRS itself may be a bound CRS (+towgs84) around the projected CRS.
   if (proj_get_type(object) == PJ_TYPE_COMPOUND_CRS) {
     PJ* inner = proj_crs_get_sub_crs(context, object, 0);
     proj_destroy(object);
     object = owned(inner, "compound CRS without horizontal part");
+  }
+  if (proj_get_type(object) == PJ_TYPE_BOUND_CRS) {
+    PJ* inner = proj_get_source_crs(context, object);
+    proj_destroy(object);
+    object = owned(inner, "bound CRS without source");
   }
   crs = object;
   if (proj_get_type(crs) != PJ_TYPE_PROJECTED_CRS) {

@@ -113,7 +113,7 @@ void edgeDistances(std::int32_t j, std::int32_t k, std::int32_t nj, std::int32_t
 
 // Rings scanned node by node before the count table is consulted: dense data
 // is found there at once, and the table pays off only for farther data.
-constexpr std::int64_t kDirectRings = 3;
+constexpr std::int64_t kDirectRings = 1;
 
 // Number of data nodes of the quadrant within rings 1..r (clipped to the layer).
 std::uint32_t quadrantCount(const SearchIndex& index, std::int32_t j, std::int32_t k,

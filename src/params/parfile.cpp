@@ -57,7 +57,18 @@ std::string displayNameOf(const char* path) {
   std::size_t slash = whole.find_last_of('/');
   std::string_view base = slash == std::string_view::npos ? whole : whole.substr(slash + 1);
   if (base.empty()) base = whole;
-  return parPrintable(base, 259);
+  // Keeps UTF-8 names readable; only control characters are escaped, so that
+  // a message stays on one line.
+  std::string shown;
+  for (char c : base) {
+    const unsigned char u = static_cast<unsigned char>(c);
+    if (u < 0x20 || u == 0x7f) {
+      shown += parPrintable(std::string_view(&c, 1));
+    } else {
+      shown += c;
+    }
+  }
+  return shown;
 }
 
 std::string directoryOf(const char* path) {
@@ -75,6 +86,11 @@ bool readWholeFile(const char* path, std::string* text, bool* tooLarge) {
   struct stat info {};
   if (fstat(fileno(stream), &info) != 0 || S_ISDIR(info.st_mode)) {
     std::fclose(stream);
+    return false;
+  }
+  if (S_ISREG(info.st_mode) && static_cast<std::uintmax_t>(info.st_size) > kParMaxFileSize) {
+    std::fclose(stream);
+    *tooLarge = true;
     return false;
   }
   char buffer[65536];

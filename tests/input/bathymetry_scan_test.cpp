@@ -56,8 +56,8 @@ TEST_F(BathymetryScan, WetLevelsStopAboveTheBed) {
   // The land value itself is land everywhere, even at the top.
   for (int l = 0; l <= 9; ++l) EXPECT_EQ(node(0, 1, l), 10.0f);
   // A level exactly at the bed is dry.
-  EXPECT_EQ(node(1, 1, 6), -4.0f);
-  EXPECT_EQ(node(1, 1, 5), 10.0f);
+  EXPECT_EQ(node(1, 1, 7), -4.0f);
+  EXPECT_EQ(node(1, 1, 6), 10.0f);
 }
 
 TEST_F(BathymetryScan, OutsideTheFootprintAndLevelsStaysLand) {

@@ -59,7 +59,9 @@ TEST(CartographyTest, EquivalentTextsAgree) {
   reference.geoToProj(10.5, 56.25, &xr, &yr);
   const std::string texts[] = {
       "UTM-32", "  utm-32n ", "EPSG:32632", "+proj=utm +zone=32 +datum=WGS84 +units=m +no_defs",
-      "+proj=utm +zone=32 +datum=WGS84 +type=crs", reference.wkt()};
+      "+proj=utm +zone=32 +datum=WGS84 +type=crs", reference.wkt(),
+      // With heights (compound CRS) and with a datum shift (bound CRS).
+      "EPSG:32632+5703", "+proj=utm +zone=32 +ellps=WGS84 +towgs84=0,0,0"};
   for (const std::string& text : texts) {
     SCOPED_TRACE(text);
     Cartography map(text, 0, 0, 0);

@@ -18,7 +18,7 @@
 namespace karnet::testing {
 
 inline constexpr float kEmpty = kDeleteValueFloat;
-inline constexpr double kLand = 1.0e20;  // a float-exact land value
+inline constexpr double kLand = 1.0e10;  // exactly a float, as the bathymetry holds it
 
 struct Observation {
   double x, y, z, value;

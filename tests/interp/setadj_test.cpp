@@ -13,7 +13,6 @@ namespace karnet {
 namespace {
 
 using testing::kEmpty;
-using testing::kLand;
 using testing::ProgressCounter;
 using testing::TestRun;
 
@@ -203,12 +202,12 @@ TEST(SetadjColumns, DryColumnExtendsFromItsData) {
 
 TEST(SetadjColumns, HeightsFollowTheLocalTopLevel) {
   // Basic level l lies at (l - lx - 1) * dz whatever the basic grid's depth:
-  // with lx = 3 and dz = 2 the top basic level 5 is at +4, 9 above a bed at -5.
+  // with lx = 3 and dz = 2 the top basic level 5 is at +2, 7 above a bed at -5.
   TestRun run(1, 1, 6);
   run.wetEverywhere(-5.0f);
   run.settings.lx = 3;
   run.settings.dz = 2.0f;
-  run.settings.MaxExtrapolationDistance[0] = 9.5f;
+  run.settings.MaxExtrapolationDistance[0] = 7.5f;
   setadj(run.observe({{0, 0, 3, 1.0}}), run.state, run.settings);
   EXPECT_EQ(column(run, 0, 0), (std::vector<float>{kEmpty, kEmpty, kEmpty, 1.0f, 1.0f, 1.0f}));
 
@@ -216,7 +215,7 @@ TEST(SetadjColumns, HeightsFollowTheLocalTopLevel) {
   strict.wetEverywhere(-5.0f);
   strict.settings.lx = 3;
   strict.settings.dz = 2.0f;
-  strict.settings.MaxExtrapolationDistance[0] = 9.0f;
+  strict.settings.MaxExtrapolationDistance[0] = 7.0f;
   setadj(strict.observe({{0, 0, 3, 1.0}}), strict.state, strict.settings);
   EXPECT_EQ(column(strict, 0, 0), (std::vector<float>{kEmpty, kEmpty, kEmpty, 1.0f, kEmpty, kEmpty}));
 }

@@ -1,0 +1,253 @@
+// karnet-mkgrid: reading .asc grids, building the bathymetry, and the program.
+#include <gtest/gtest.h>
+#include <sys/wait.h>
+
+#include <cmath>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "gridfile/nc_test_files.h"
+#include "input/bathymetry_read.h"
+#include "input/cartography.h"
+#include "mkgrid/esri_ascii.h"
+#include "mkgrid/grid_builder.h"
+#include "support/file_description.h"
+#include "support/float_grid.h"
+
+namespace karnet {
+namespace {
+
+using mkgrid::BuildOptions;
+using mkgrid::EsriGrid;
+using mkgrid::OriginSource;
+using test::ScratchDir;
+
+constexpr const char* kSmallGrid =
+    "ncols 4\n"
+    "nrows 3\n"
+    "xllcorner 1000\n"
+    "yllcorner 2000\n"
+    "cellsize 50\n"
+    "NODATA_value -9999\n"
+    "-1 -2 -3 -9999\n"
+    "-4 -5 -6 -7\n"
+    "-8 -9 -10 -11\n";
+
+bool parse(const std::string& text, EsriGrid* grid, std::string* error) {
+  std::istringstream in(text);
+  return mkgrid::parseEsriAscii(in, grid, error);
+}
+
+// ---- .asc reading ---------------------------------------------------------
+
+TEST(MkgridAscii, HeaderVariantsAndValues) {
+  EsriGrid grid;
+  std::string error;
+  ASSERT_TRUE(parse(kSmallGrid, &grid, &error)) << error;
+  EXPECT_EQ(grid.ncols, 4);
+  EXPECT_EQ(grid.nrows, 3);
+  EXPECT_TRUE(grid.xIsCorner);
+  EXPECT_EQ(grid.dx, 50.0);
+  EXPECT_EQ(grid.dy, 50.0);
+  EXPECT_TRUE(grid.isNodata(-9999));
+  ASSERT_EQ(grid.values.size(), 12u);
+  EXPECT_EQ(grid.values[3], -9999.0);
+  EXPECT_EQ(grid.values[11], -11.0);
+
+  // Centre references, separate dx/dy, any keyword case, values spread over
+  // lines as they come, CR LF line ends, no NODATA.
+  ASSERT_TRUE(parse("NCOLS 2\r\nNROWS 2\r\nXLLCENTER -5.5\r\nyllcenter 7\r\nDX 10\r\ndy 20\r\n"
+                    "1 2 3\r\n4\r\n",
+                    &grid, &error))
+      << error;
+  EXPECT_FALSE(grid.xIsCorner);
+  EXPECT_FALSE(grid.yIsCorner);
+  EXPECT_EQ(grid.xll, -5.5);
+  EXPECT_EQ(grid.dx, 10.0);
+  EXPECT_EQ(grid.dy, 20.0);
+  EXPECT_FALSE(grid.hasNodata);
+  EXPECT_EQ(grid.values, (std::vector<double>{1, 2, 3, 4}));
+}
+
+TEST(MkgridAscii, FaultsAreNamed) {
+  const std::string head = "ncols 2\nnrows 2\nxllcorner 0\nyllcorner 0\ncellsize 1\n";
+  struct Case {
+    std::string text;
+    const char* expected;  // part of the message
+  };
+  const Case cases[] = {
+      {head + "1 2 3\n", "expected 4 values"},
+      {head + "1 2 3 4 5\n", "line 6: more values"},
+      {head + "1 2 x 4\n", "line 6: bad grid value 'x'"},
+      {head + "1 2 nan 4\n", "bad grid value 'nan'"},
+      {head + "1 2 1e400 4\n", "bad grid value"},
+      {"ncols 2\nnrows 2\nxllcorner 0\ncellsize 1\n1 2 3 4\n", "lacks yllcorner or yllcenter"},
+      {"ncols 2\nncols 2\n", "line 2: repeated header keyword 'ncols'"},
+      {"ncols 0\n", "ncols must be a whole number"},
+      {"ncols 2.5\n", "ncols must be a whole number"},
+      {"ncols 2\nnrows 2\nxllcorner 0\nyllcorner 0\ncellsize -1\n", "cellsize must be positive"},
+      {"ncols 2\nnrows 2\nxllcorner 0\nyllcorner 0\ncellsize 1\ndx 1\n", "both cellsize"},
+      {"ncols 2\nbogus 3\n", "line 2: unknown header keyword 'bogus'"},
+      {"ncols\n", "line 1: header line must be"},
+      {"ncols 65536\nnrows 65536\nxllcorner 0\nyllcorner 0\ncellsize 1\n1\n", "exceeds"},
+      {"", "lacks ncols"},
+  };
+  for (const Case& c : cases) {
+    EsriGrid grid;
+    std::string error;
+    EXPECT_FALSE(parse(c.text, &grid, &error)) << c.text;
+    EXPECT_NE(error.find(c.expected), std::string::npos) << "message: " << error;
+  }
+  EsriGrid grid;
+  std::string error;
+  EXPECT_FALSE(mkgrid::readEsriAsciiFile("/nonexistent/grid.asc", &grid, &error));
+  EXPECT_NE(error.find("cannot open"), std::string::npos);
+}
+
+// ---- building -------------------------------------------------------------
+
+TEST(MkgridBuild, RowsRunSouthToNorthAndNodataBecomesLand) {
+  EsriGrid grid;
+  std::string error;
+  ASSERT_TRUE(parse(kSmallGrid, &grid, &error));
+  BuildOptions options;
+  options.landValue = 2.5;
+  mkgrid::Bathymetry b;
+  ASSERT_TRUE(mkgrid::buildBathymetry(grid, options, &b, &error)) << error;
+  EXPECT_EQ(b.nx, 4);
+  EXPECT_EQ(b.ny, 3);
+  EXPECT_EQ(b.values,
+            (std::vector<float>{-8, -9, -10, -11, -4, -5, -6, -7, -1, -2, -3, 2.5f}));
+  // LOCAL: the origin is the south-west cell centre in plain metres.
+  EXPECT_EQ(b.longitude, 1025.0);
+  EXPECT_EQ(b.latitude, 2025.0);
+  EXPECT_EQ(b.orientation, 0.0);
+  EXPECT_EQ(b.landValue, 2.5f);
+
+  options.negate = true;
+  options.hasOrientation = true;
+  options.orientation = 30.0;
+  options.origin = OriginSource::Projected;
+  options.originA = 7.0;
+  options.originB = 8.0;
+  ASSERT_TRUE(mkgrid::buildBathymetry(grid, options, &b, &error)) << error;
+  EXPECT_EQ(b.values[0], 8.0f);
+  EXPECT_EQ(b.values[11], 2.5f);  // land is not negated
+  EXPECT_EQ(b.longitude, 7.0);
+  EXPECT_EQ(b.orientation, 30.0);
+}
+
+TEST(MkgridBuild, ProjectedOriginGoesThroughTheProjection) {
+  EsriGrid grid;
+  std::string error;
+  ASSERT_TRUE(parse("ncols 1\nnrows 1\nxllcenter 600000\nyllcenter 6200000\ncellsize 100\n-3\n",
+                    &grid, &error));
+  BuildOptions options;
+  options.projection = "UTM-32";
+  mkgrid::Bathymetry b;
+  ASSERT_TRUE(mkgrid::buildBathymetry(grid, options, &b, &error)) << error;
+  Cartography map("UTM-32", 0, 0, 0);
+  double x = 0, y = 0;
+  map.geoToProj(b.longitude, b.latitude, &x, &y);
+  EXPECT_NEAR(x, 600000.0, 1e-4);
+  EXPECT_NEAR(y, 6200000.0, 1e-4);
+  // East of the central meridian: the grid's columns run along grid north,
+  // which lies clockwise of true north.
+  EXPECT_GT(b.orientation, 0.0);
+  EXPECT_NEAR(b.orientation, map.convergence(b.longitude, b.latitude), 1e-12);
+
+  options.origin = OriginSource::Geographic;
+  options.originA = 10.5;
+  options.originB = 56.0;
+  ASSERT_TRUE(mkgrid::buildBathymetry(grid, options, &b, &error)) << error;
+  EXPECT_EQ(b.longitude, 10.5);
+  EXPECT_EQ(b.latitude, 56.0);
+
+  options.projection = "NOT-A-PROJECTION";
+  EXPECT_FALSE(mkgrid::buildBathymetry(grid, options, &b, &error));
+  EXPECT_NE(error.find("unusable projection"), std::string::npos) << error;
+}
+
+// ---- the program ----------------------------------------------------------
+
+struct ProgramRun {
+  int exitCode;
+  std::string output;
+};
+
+ProgramRun runMkgrid(const std::string& arguments) {
+  const std::string command = std::string(KARNET_MKGRID_BINARY) + " " + arguments + " 2>&1";
+  ProgramRun run{-1, ""};
+  FILE* pipe = popen(command.c_str(), "r");
+  if (pipe == nullptr) return run;
+  char buffer[4096];
+  std::size_t n;
+  while ((n = std::fread(buffer, 1, sizeof buffer, pipe)) > 0) run.output.append(buffer, n);
+  const int status = pclose(pipe);
+  run.exitCode = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+  return run;
+}
+
+TEST(MkgridProgram, MakesAFileTheBathymetryReaderTakes) {
+  ScratchDir dir;
+  test::writeBytes(dir.file("in.asc"), kSmallGrid);
+  const ProgramRun run = runMkgrid("--projection LOCAL --land-value=0.5 -o 12 '" + dir.file("in.asc") +
+                            "' '" + dir.file("out.nc") + "'");
+  ASSERT_EQ(run.exitCode, 0) << run.output;
+  FileDescription* d = descriptionNew(2);
+  FloatGrid2D grid;
+  ASSERT_EQ(bathymetryRead(dir.file("out.nc").c_str(), *d, 1, grid), 1);
+  EXPECT_EQ(d->axes[1].lastIndex, 3);
+  EXPECT_EQ(d->axes[2].lastIndex, 2);
+  EXPECT_EQ(d->axes[1].spacing, 50.0f);
+  EXPECT_EQ(d->axes[1].origin, 1025.0);
+  EXPECT_EQ(d->axes[2].origin, 2025.0);
+  EXPECT_EQ(d->misc[0], 12.0);
+  EXPECT_EQ(d->misc[2], -900.0);
+  EXPECT_EQ(d->misc[3], 0.5);
+  EXPECT_EQ(d->items[1].values[1], -11.0f);
+  EXPECT_EQ(d->items[1].values[2], 0.5f);
+  EXPECT_EQ(grid.at(0, 0), -8.0f);
+  EXPECT_EQ(grid.at(3, 2), 0.5f);
+  grid2DFree(grid);
+  descriptionFree(d);
+  EXPECT_EQ(dir.entries().size(), 2u);
+}
+
+TEST(MkgridProgram, BadInputEndsWithCodeOneAndAMessage) {
+  ScratchDir dir;
+  test::writeBytes(dir.file("in.asc"), kSmallGrid);
+  test::writeBytes(dir.file("bad.asc"), "ncols 2\nnrows 1\nxllcorner 0\nyllcorner 0\n");
+  test::writeBytes(dir.file("out.nc"), "earlier");
+  const std::string in = "'" + dir.file("in.asc") + "' ";
+  const std::string out = "'" + dir.file("out.nc") + "'";
+  struct Case {
+    std::string arguments;
+    const char* expected;
+  };
+  const Case cases[] = {
+      {"", "Usage: karnet-mkgrid [options] INPUT.asc OUTPUT.nc"},
+      {in, "give one input grid and one output file"},
+      {"--frobnicate " + in + out, "unknown option '--frobnicate'"},
+      {"--land-value abc " + in + out, "bad land value 'abc'"},
+      {"--origin-geo 10 " + in + out, "needs two numbers"},
+      {"--origin-geo 1,2 --origin-proj 3,4 " + in + out, "only once"},
+      {"-p WHATEVER " + in + out, "unusable projection 'WHATEVER'"},
+      {"'" + dir.file("bad.asc") + "' " + out, "lacks cellsize"},
+      {"'" + dir.file("none.asc") + "' " + out, "cannot open"},
+      {in + "'" + dir.file("no/dir/out.nc") + "'", "cannot create"},
+  };
+  for (const Case& c : cases) {
+    const ProgramRun run = runMkgrid(c.arguments);
+    EXPECT_EQ(run.exitCode, 1) << c.arguments;
+    EXPECT_NE(run.output.find(c.expected), std::string::npos) << run.output;
+  }
+  EXPECT_EQ(test::readBytes(dir.file("out.nc")), "earlier");
+  const ProgramRun help = runMkgrid("--help");
+  EXPECT_EQ(help.exitCode, 0);
+  EXPECT_NE(help.output.find("--land-value"), std::string::npos);
+}
+
+}  // namespace
+}  // namespace karnet
