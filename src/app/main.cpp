@@ -62,6 +62,9 @@ char** argumentVector = nullptr;
   if (karnet::makeLogFileName(parameterFile, logFileName) != 0) {
     log = std::fopen(logFileName, "w");
   }
+  // Line-buffered, so that a user (or a script) following the log sees each
+  // report line as soon as it is written; the log is small.
+  if (log != nullptr) std::setvbuf(log, nullptr, _IOLBF, 0);
   karnet::logSetStream(log != nullptr ? log : stderr);
 
   karnet::setupRun(parameterFile);

@@ -121,7 +121,6 @@ TEST(BilinearRun, ResultFileCarriesItsDescription) {
   ASSERT_EQ(nc_inq_varid(nc, "crs", &crs), NC_NOERR);
   EXPECT_EQ(text(crs, "projection"), "LOCAL");
   EXPECT_EQ(text(NC_GLOBAL, "Conventions"), "CF-1.8");
-  EXPECT_EQ(text(NC_GLOBAL, "title"), "karnet test case");
   float misc[7] = {};
   std::size_t miscLength = 0;
   ASSERT_EQ(nc_inq_attlen(nc, NC_GLOBAL, "Q84_Misc", &miscLength), NC_NOERR);
@@ -232,7 +231,8 @@ TEST(BilinearRun, HostCancelEndsTheRunSuccessfullyWithoutResult) {
       runKarnet({"//apv", "case.pfs"}, dir.path(), kQuiet, signalAfterScan(dir, SIGUSR1));
   EXPECT_EQ(r.exitCode, 0);
   const std::string log = readFile(dir.file("case.log"));
-  EXPECT_NE(log.find("Cancel computation"), std::string::npos) << log;
+  // The host shows the cancel; the log only ends.
+  EXPECT_NE(r.err.find("Cancel computation"), std::string::npos) << r.err;
   EXPECT_NE(log.find("-- Completion code : Successful"), std::string::npos) << log;
   EXPECT_FALSE(fileExists(dir.file("result.nc")));
 }

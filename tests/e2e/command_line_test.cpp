@@ -56,7 +56,7 @@ TEST(CommandLine, BuildmodeNigthSilencesTheMessageOnly) {
 
 TEST(CommandLine, MissingParameterFileIsLoggedBesideIt) {
   TempDir dir;
-  const ProcessResult r = runKarnet({"-debug", "runs/../missing.pfs"}, dir.path(),
+  const ProcessResult r = runKarnet({"-debug", "missing.pfs"}, dir.path(),
                                     {{"buildmode", "nigth"}});
   EXPECT_EQ(r.exitCode, 1);
   const std::string log = readFile(dir.file("missing.log"));

@@ -209,7 +209,10 @@ void writeBathymetry(const std::string& path, const BathymetrySpec& spec) {
   for (int v : {xVar, yVar}) {
     check(nc_put_att_text(nc, v, "units", 1, "m"), "units");
     check(nc_put_att_text(nc, v, "axis", 1, v == xVar ? "X" : "Y"), "axis");
-    check(nc_put_att_double(nc, v, "spacing", NC_DOUBLE, 1, &spec.spacing), "spacing");
+    // A grid without a spacing (one node) gets none.
+    if (spec.spacing > 0) {
+      check(nc_put_att_double(nc, v, "spacing", NC_DOUBLE, 1, &spec.spacing), "spacing");
+    }
   }
   const int dims[2] = {yDim, xDim};
   check(nc_def_var(nc, "bathymetry", NC_FLOAT, 2, dims, &bVar), "bathymetry var");

@@ -36,6 +36,9 @@ TEST(Validation, EachRefusalHasItsMessageAndExitCode1) {
        "ERROR: in input file selection"},
       {"unreadable bathymetry", [](ParameterFile& p) { p.fileName = "|nowhere.nc|"; }, {},
        "ERROR: in input file selection"},
+      {"bathymetry that is not a gridded file", {},
+       [](const TempDir& d) { writeFile(d.file("bathymetry.nc"), "not a grid\n"); },
+       "dx = -0.000000 dy = -0.000000"},
       {"reversed level range", [](ParameterFile& p) { p.zRange = "9, 3"; }, {},
        "l0 = 9 lx = 3"},
       {"zero level spacing", [](ParameterFile& p) { p.spacing = "0"; }, {}, "dz = 0.000000"},
@@ -101,11 +104,12 @@ TEST(Validation, ZeroNodeDistanceIsRefused) {
   p.projection = "'LOCAL'";
   writeSmallCase(dir, p);
   BathymetrySpec flat;
-  flat.nx = 4;
-  flat.ny = 3;
+  // A single node: neither axis has a spacing.
+  flat.nx = 1;
+  flat.ny = 1;
   flat.spacing = 0.0;
   flat.projection = "LOCAL";
-  flat.heights.assign(12, -10.0f);
+  flat.heights.assign(1, -10.0f);
   writeBathymetry(dir.file("bathymetry.nc"), flat);
   const ProcessResult r = runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}});
   EXPECT_EQ(r.exitCode, 1);
