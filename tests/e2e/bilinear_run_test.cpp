@@ -134,25 +134,6 @@ TEST(BilinearRun, ResultFileCarriesItsDescription) {
   nc_close(nc);
 }
 
-TEST(BilinearRun, ResultOpensInXarray) {
-  if (!fileExists("/usr/bin/python3")) GTEST_SKIP() << "no system python";
-  TempDir dir;
-  writePlaneCase(dir, ParameterFile{});
-  ASSERT_EQ(runKarnet({"case.pfs"}, dir.path(), kQuiet).exitCode, 0);
-  const ProcessResult py = runProgram(
-      "/usr/bin/python3",
-      {"-c",
-       "import xarray as xr\n"
-       "ds = xr.open_dataset('result.nc')\n"
-       "t = ds['Temperature']\n"
-       "print(t.dims, t.shape, t.attrs['units'], round(float(t.isel(time=0, z=0, y=10, x=10)), 3))\n"},
-      dir.path());
-  ASSERT_EQ(py.exitCode, 0) << py.err;
-  EXPECT_NE(py.out.find("('time', 'z', 'y', 'x') (1, 10, 21, 21) degree_Celsius 10.5"),
-            std::string::npos)
-      << py.out;
-}
-
 TEST(BilinearRun, FailedWriteIsAnErrorAndLeavesNoFile) {
   TempDir dir;
   ParameterFile p;
