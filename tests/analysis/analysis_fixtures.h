@@ -2,6 +2,7 @@
 #ifndef KARNET_TESTS_ANALYSIS_ANALYSIS_FIXTURES_H_
 #define KARNET_TESTS_ANALYSIS_ANALYSIS_FIXTURES_H_
 
+#include <array>
 #include <cstdint>
 #include <vector>
 
@@ -36,15 +37,14 @@ struct ScopedWorkspace {
   ScopedWorkspace(const ScopedWorkspace&) = delete;
   ScopedWorkspace& operator=(const ScopedWorkspace&) = delete;
 
-  // Stores the layer's data cells (x, y, value) in the given order.
-  void setCells(const std::vector<float>& x, const std::vector<float>& y,
-                const std::vector<float>& value) {
-    for (std::size_t i = 0; i < x.size(); ++i) {
-      ws.dataX[i] = x[i];
-      ws.dataY[i] = y[i];
-      ws.dataValue[i] = value[i];
+  // Stores the layer's data cells {x, y, value} in the given order.
+  void setCells(const std::vector<std::array<float, 3>>& cells) {
+    for (std::size_t i = 0; i < cells.size(); ++i) {
+      ws.dataX[i] = cells[i][0];
+      ws.dataY[i] = cells[i][1];
+      ws.dataValue[i] = cells[i][2];
     }
-    ws.dataCount = static_cast<std::int32_t>(x.size());
+    ws.dataCount = static_cast<std::int32_t>(cells.size());
   }
   OaWorkspace ws;
 };

@@ -3,7 +3,6 @@
 
 #include <gtest/gtest.h>
 
-#include <array>
 #include <cstdio>
 #include <cstring>
 #include <string>
@@ -27,20 +26,17 @@ struct Layer {
   Layer(std::int32_t nj, std::int32_t nk, std::int32_t jOff, std::int32_t kOff,
         std::int32_t width, std::int32_t height)
       : values(static_cast<std::size_t>(nj * nk), kHole),
-        bed(static_cast<std::size_t>(nj * nk), -10.0f),
+        bed(values.size(), -10.0f),
+        grid{0, 0, nj, nk, values.data()},
+        bedGrid{0, 0, nj, nk, bed.data()},
+        input{&bedGrid, kLand, kHoleWide, jOff, kOff, 0},
         settings(testing::withLimit(8)) {
-    grid.nj = bedGrid.nj = nj;
-    grid.nk = bedGrid.nk = nk;
-    grid.data = values.data();
-    bedGrid.data = bed.data();
-    input = {&bedGrid, kLand, kHoleWide, jOff, kOff, 0};
     settings.jx = width - 1;
     settings.kx = height - 1;
   }
-  float& value(std::int32_t j, std::int32_t k) { return values[static_cast<std::size_t>(k * grid.nj + j)]; }
-  void makeDry(std::int32_t j, std::int32_t k) {
-    bed[static_cast<std::size_t>(k * grid.nj + j)] = static_cast<float>(kLand);
-  }
+  float& value(std::int32_t j, std::int32_t k) { return values[std::size_t(k * grid.nj + j)]; }
+  void makeDry(std::int32_t j, std::int32_t k) { bed[std::size_t(k * grid.nj + j)] = kLand; }
+  // nData: the room made for data cells; by default what the layer holds.
   std::int32_t analyse(std::int32_t& failures, std::int32_t nData = -1) {
     OaWorkspace ws;
     if (nData < 0) nData = countDataCells(grid, kHoleWide);
@@ -52,53 +48,54 @@ struct Layer {
   RunSettings settings;
 };
 
-TEST(AnalyseLayer, LayerWithoutDataFailsAtEveryWetFootprintNode) {
-  Layer layer(6, 5, 1, 1, 4, 3);
-  layer.makeDry(2, 2);
+TEST(AnalyseLayer, NoDataFailsAndOneDataCellFillsEveryWetFootprintNode) {
+  Layer empty(6, 5, 1, 1, 4, 3);
+  empty.makeDry(2, 2);  // in the footprint: neither estimated nor counted
   std::int32_t failures = -1;
-  EXPECT_EQ(layer.analyse(failures), 0);
+  EXPECT_EQ(empty.analyse(failures), 0);
   EXPECT_EQ(failures, 4 * 3 - 1);
-  for (float v : layer.values) EXPECT_EQ(v, kHole);
-}
+  EXPECT_EQ(empty.values, std::vector<float>(6 * 5, kHole));
 
-TEST(AnalyseLayer, OneDataCellGivesItsValueToEveryWetFootprintNode) {
-  Layer layer(7, 6, 2, 1, 3, 4);
-  layer.value(0, 5) = 11.5f;  // outside the footprint: data, never changed
-  layer.makeDry(3, 2);        // in the footprint: neither estimated nor counted
-  std::int32_t failures = -1;
-  EXPECT_EQ(layer.analyse(failures), 3 * 4 - 1);
+  Layer one(7, 6, 2, 1, 3, 4);
+  one.value(0, 5) = 11.5f;  // outside the footprint: data, never changed
+  one.makeDry(3, 2);
+  EXPECT_EQ(one.analyse(failures), 3 * 4 - 1);
   EXPECT_EQ(failures, 0);
   for (std::int32_t j = 0; j < 7; ++j) {
     for (std::int32_t k = 0; k < 6; ++k) {
-      const bool filled = (j >= 2 && j <= 4 && k >= 1 && k <= 4 && !(j == 3 && k == 2)) ||
-                          (j == 0 && k == 5);
-      EXPECT_EQ(layer.value(j, k), filled ? 11.5f : kHole) << j << "," << k;
+      const bool footprint = j >= 2 && j <= 4 && k >= 1 && k <= 4 && !(j == 3 && k == 2);
+      const bool filled = footprint || (j == 0 && k == 5);
+      EXPECT_EQ(one.value(j, k), filled ? 11.5f : kHole) << j << "," << k;
     }
   }
+  // jOff = 0 and jx = j0 make the progress period 3 * 0: still every node.
+  Layer column(1, 5, 0, 0, 1, 5);
+  column.value(0, 2) = 1.5f;
+  EXPECT_EQ(column.analyse(failures), 5);
+  EXPECT_EQ(column.values, std::vector<float>(5, 1.5f));
 }
 
 TEST(AnalyseLayer, ClipsWetFootprintValuesAndMinDataWinsOverMaxData) {
   // SearchRadius 0: a node is estimated only from a cell on itself, which
-  // gives that cell's value; every other node fails and stays a hole.
-  for (const bool swapped : {false, true}) {
+  // gives that cell's value; every other node fails and stays a hole. The
+  // cells on the dry node (4, 3) and outside the footprint (0, 0) are left alone.
+  const float cells[][3] = {{1, 0, 0.5f}, {2, 1, 5}, {3, 2, 9.5f}, {4, 3, -7}, {0, 0, 50}};
+  const struct {
+    float minData, maxData, expected[5];
+  } cases[] = {{2, 8, {2, 5, 8, -7, 50}}, {20, 5, {20, 20, 20, -7, 50}}};
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.minData);
     Layer layer(6, 4, 1, 0, 4, 4);
     layer.settings.SearchRadius = 0.0f;
-    layer.settings.MinData = swapped ? 20.0f : 2.0f;
-    layer.settings.MaxData = swapped ? 5.0f : 8.0f;
-    layer.value(1, 0) = 0.5f;
-    layer.value(2, 1) = 5.0f;
-    layer.value(3, 2) = 9.5f;
-    layer.value(4, 3) = -7.0f;  // on a dry node: left alone
+    layer.settings.MinData = c.minData;
+    layer.settings.MaxData = c.maxData;
+    for (const auto& cell : cells) layer.value(int(cell[0]), int(cell[1])) = cell[2];
     layer.makeDry(4, 3);
-    layer.value(0, 0) = 50.0f;  // outside the footprint: left alone
     std::int32_t failures = -1;
     EXPECT_EQ(layer.analyse(failures), 3);
     EXPECT_EQ(failures, 4 * 4 - 1 - 3);
-    EXPECT_EQ(layer.value(1, 0), swapped ? 20.0f : 2.0f);
-    EXPECT_EQ(layer.value(2, 1), swapped ? 20.0f : 5.0f);
-    EXPECT_EQ(layer.value(3, 2), swapped ? 20.0f : 8.0f);
-    EXPECT_EQ(layer.value(4, 3), -7.0f);
-    EXPECT_EQ(layer.value(0, 0), 50.0f);
+    for (int i = 0; i < 5; ++i)
+      EXPECT_EQ(layer.value(int(cells[i][0]), int(cells[i][1])), c.expected[i]) << i;
     EXPECT_EQ(layer.value(2, 2), kHole);
   }
 }
@@ -118,19 +115,11 @@ TEST(AnalyseLayer, MoreCellsThanCountedAreReportedAndLeftOut) {
   for (float v : layer.values) EXPECT_EQ(v, 6.0f);
 }
 
-TEST(AnalyseLayer, SingleColumnGridAtTheOriginVisitsEveryNode) {
-  // jOff = 0 and jx = j0 make the progress period 3 * 0.
-  Layer layer(1, 5, 0, 0, 1, 5);
-  layer.value(0, 2) = 1.5f;
-  std::int32_t failures = -1;
-  EXPECT_EQ(layer.analyse(failures), 5);
-  for (float v : layer.values) EXPECT_EQ(v, 1.5f);
-}
-
 TEST(ObjectiveAnalysis, AnalysesTheFootprintLayersAndWritesTheStatistics) {
   // Basic grid 5 x 4 x 2, footprint (1..3, 1..2) on both layers. Node (2, 2)
   // has its bed between the levels: dry on layer 0, wet on layer 1, too close
-  // to the bed for any vertical extension.
+  // to the bed for any vertical extension. Layer 0 holds a cell inside the
+  // footprint, one outside and one on the dry node.
   constexpr std::int32_t nj = 5, nk = 4, nl = 2;
   RunState state;
   RunSettings settings = testing::withLimit(8);
@@ -151,8 +140,7 @@ TEST(ObjectiveAnalysis, AnalysesTheFootprintLayersAndWritesTheStatistics) {
   state.landValue = kLand;
   state.basicBathymetry.at(2, 2, 0) = static_cast<float>(kLand);
   state.basicBathymetry.at(2, 2, 1) = -1.5f;
-  // Layer 0: a cell inside the footprint, one outside, one on the dry node.
-  const std::array<std::array<double, 3>, 3> obs = {{{1, 1, 6}, {4, 3, 14}, {2, 2, 9}}};
+  const double obs[3][3] = {{1, 1, 6}, {4, 3, 14}, {2, 2, 9}};
   ASSERT_TRUE(scatterDataAlloc(state.scatter, 3));
   for (std::size_t i = 0; i < 3; ++i) {
     state.scatter.x[i] = obs[i][0];
@@ -160,9 +148,7 @@ TEST(ObjectiveAnalysis, AnalysesTheFootprintLayersAndWritesTheStatistics) {
     state.scatter.z[i] = 0.0;
     state.scatter.value[i] = obs[i][2];
   }
-
   std::FILE* log = std::tmpfile();
-  ASSERT_NE(log, nullptr);
   logSetStream(log);
   objectiveAnalysis(2, 1, 1, 0, state, settings);
   logSetStream(nullptr);
@@ -170,41 +156,30 @@ TEST(ObjectiveAnalysis, AnalysesTheFootprintLayersAndWritesTheStatistics) {
   std::rewind(log);
   text.resize(std::fread(text.data(), 1, text.size(), log));
   std::fclose(log);
-
   // Five wet footprint nodes estimated on layer 0; six failed on layer 1.
-  const std::string block =
-      "\n-------------------------------------------------\n"
-      "Statistics for local grid:\n\n"
-      "No. of data grid cells                  : 3\n"
-      "No. of interpolations                   : 5\n"
-      "No. of unsuccesful interpolations       : 6\n"
-      "-------------------------------------------------\n\n";
+  const std::string rule = "-------------------------------------------------\n";
+  const std::string block = "\n" + rule + "Statistics for local grid:\n\n" +
+                            "No. of data grid cells                  : 3\n" +
+                            "No. of interpolations                   : 5\n" +
+                            "No. of unsuccesful interpolations       : 6\n" + rule + "\n";
   ASSERT_GE(text.size(), block.size());
   EXPECT_EQ(text.substr(text.size() - block.size()), block);
 
-  // Layer 0 analysed on its own gives the same bits at the wet footprint nodes.
+  // Layer 0 analysed on its own gives the same bits, but for the dry node:
+  // blank although it held an observation. Layer 1 stays empty.
   Layer reference(nj, nk, 1, 1, 3, 2);
   reference.settings = settings;
-  for (const auto& o : obs) reference.value(static_cast<int>(o[0]), static_cast<int>(o[1])) = static_cast<float>(o[2]);
+  for (const auto& o : obs) reference.value(int(o[0]), int(o[1])) = static_cast<float>(o[2]);
   reference.makeDry(2, 2);
   std::int32_t failures = 0;
   reference.analyse(failures);
-  for (std::int32_t j = 0; j < nj; ++j) {
-    for (std::int32_t k = 0; k < nk; ++k) {
-      const float got = state.basicValues.at(j, k, 0);
-      const bool footprint = j >= 1 && j <= 3 && k >= 1 && k <= 2;
-      if (j == 2 && k == 2) {
-        EXPECT_EQ(got, kHole);  // dry: blank although it held an observation
-      } else if (footprint) {
-        const float want = reference.value(j, k);
-        EXPECT_EQ(std::memcmp(&got, &want, sizeof got), 0) << j << "," << k;
-        EXPECT_NE(got, kHole);
-      } else {
-        EXPECT_EQ(got, (j == 4 && k == 3) ? 14.0f : kHole) << j << "," << k;  // as gridded
-      }
-      EXPECT_EQ(state.basicValues.at(j, k, 1), kHole) << j << "," << k;
-    }
-  }
+  reference.value(2, 2) = kHole;
+  const float* layer0 = state.basicValues.data;
+  EXPECT_EQ(std::memcmp(layer0, reference.values.data(), nj * nk * sizeof(float)), 0);
+  EXPECT_EQ(layer0[3 * nj + 4], 14.0f);  // outside the footprint: as gridded
+  EXPECT_NE(layer0[1 * nj + 3], kHole);
+  EXPECT_EQ(std::vector<float>(layer0 + nj * nk, layer0 + 2 * nj * nk),
+            std::vector<float>(nj * nk, kHole));
   releaseAll(state);
 }
 

@@ -6,6 +6,7 @@
 #include <array>
 #include <cmath>
 #include <cstring>
+#include <numeric>
 #include <random>
 #include <vector>
 
@@ -16,8 +17,6 @@ namespace karnet {
 namespace {
 
 using testing::ScopedWorkspace;
-
-bool sameBits(float a, float b) { return std::memcmp(&a, &b, sizeof a) == 0; }
 
 // DecayDistance = 1 and ZeroCrossingDistance = 3 on unit spacing: decay2 = 2,
 // zeroCross2 = 9, cut-off beyond d2 = 80.
@@ -31,8 +30,7 @@ RunSettings shortRange(std::int32_t limit, float radius = 100.0f) {
 
 TEST(Correlation, OneAtZeroZeroAtCrossingAndCutBeyondForty) {
   RunSettings s = shortRange(1);
-  s.dx = 250.0f;  // the scale factors are in node units
-  s.DecayDistance = s.ZeroCrossingDistance = 250.0f;
+  s.dx = s.DecayDistance = s.ZeroCrossingDistance = 250.0f;  // scale factors in node units
   ScopedWorkspace unit(0, 4, 4, s);
   EXPECT_EQ(unit.ws.decay2, 2.0f);
   EXPECT_EQ(unit.ws.zeroCross2, 1.0f);
@@ -44,16 +42,17 @@ TEST(Correlation, OneAtZeroZeroAtCrossingAndCutBeyondForty) {
   EXPECT_NEAR(correlation(4.0f, w.ws), std::exp(-2.0) * (1.0 - 4.0 / 9.0), 1e-7);
   EXPECT_LT(correlation(80.0f, w.ws), 0.0f);  // evaluated up to 40 * decay2
   EXPECT_EQ(correlation(80.5f, w.ws), 0.0f);  // cut beyond it
-}
 
-TEST(Correlation, TableGivesTheSameBitsAsTheModel) {
+  // The table gives the very bits of the model, also where the model gives
+  // not-a-number (at the node) and -inf (beyond it) for a zero crossing at 0.
   for (const float zero : {8.0f, 0.0f}) {
-    RunSettings s = testing::withLimit(8);
-    s.ZeroCrossingDistance = zero;  // 0: not-a-number at the node, -inf beyond
-    ScopedWorkspace w(0, 40, 30, s);
-    ASSERT_GT(w.ws.corrTableSize, 1);
+    s = testing::withLimit(8);
+    s.ZeroCrossingDistance = zero;
+    ScopedWorkspace t(0, 40, 30, s);
+    ASSERT_GT(t.ws.corrTableSize, 1);
     for (float d2 = 0.0f; d2 < 2000.0f; d2 += 0.5f) {
-      ASSERT_TRUE(sameBits(tabledCorrelation(d2, w.ws), correlation(d2, w.ws))) << d2;
+      const float tabled = tabledCorrelation(d2, t.ws), model = correlation(d2, t.ws);
+      ASSERT_EQ(std::memcmp(&tabled, &model, sizeof model), 0) << zero << " " << d2;
     }
   }
 }
@@ -76,15 +75,7 @@ void passByPassSort(std::vector<float>& corr, std::vector<std::int32_t>& index) 
   }
 }
 
-TEST(SortByCorrelation, HandWorkedTiesAndThePassByPassMethod) {
-  // Gap 2 moves the 0.9 at index 4 past index 0's 0.5, so of the equal 0.5
-  // values index 0 ends first and index 3 before index 2.
-  std::vector<float> corr = {0.5f, 0.9f, 0.5f, 0.5f, 0.9f};
-  std::vector<std::int32_t> index = {0, 1, 2, 3, 4};
-  sortByCorrelation(corr.data(), index.data(), 5);
-  EXPECT_EQ(corr, (std::vector<float>{0.9f, 0.9f, 0.5f, 0.5f, 0.5f}));
-  EXPECT_EQ(index, (std::vector<std::int32_t>{4, 1, 0, 3, 2}));
-
+TEST(SortByCorrelation, MatchesThePassByPassMethod) {
   // Random lists with many ties and an occasional not-a-number (which never
   // moves, so the sort ends) give the same order as the pass-by-pass method.
   std::mt19937 random(17);
@@ -95,7 +86,7 @@ TEST(SortByCorrelation, HandWorkedTiesAndThePassByPassMethod) {
     for (float& v : c) v = 0.2f * static_cast<float>(level(random)) - 0.3f;
     if (trial % 7 == 0) c[static_cast<std::size_t>(trial % n)] = std::nanf("");
     std::vector<std::int32_t> i(static_cast<std::size_t>(n));
-    for (int p = 0; p < n; ++p) i[static_cast<std::size_t>(p)] = p;
+    std::iota(i.begin(), i.end(), 0);
     std::vector<float> refC = c;
     std::vector<std::int32_t> refI = i;
     passByPassSort(refC, refI);
@@ -104,46 +95,40 @@ TEST(SortByCorrelation, HandWorkedTiesAndThePassByPassMethod) {
   }
 }
 
-// Chooses for node (j, k) among cells given in collection order; returns the
-// chosen values in order.
-std::vector<float> chosen(const RunSettings& s, const std::vector<std::array<float, 3>>& cells,
-                          std::int32_t j, std::int32_t k) {
-  ScopedWorkspace w(static_cast<std::int32_t>(cells.size()), 12, 12, s);
-  std::vector<float> x, y, v;
-  for (const auto& c : cells) {
-    x.push_back(c[0]);
-    y.push_back(c[1]);
-    v.push_back(c[2]);
+TEST(SelectData, RadiusLimitOrderAndTiesAtTheCut) {
+  using Cells = std::vector<std::array<float, 3>>;  // in collection order
+  const Cells five = {{2, 2, 10}, {4, 5, 20}, {5, 7, 30}, {8, 5, 40}, {8, 6, 50}};
+  const Cells line = {{0, 1, 1}, {0, 4, 2}, {0, 9, 3}, {0, 10, 4}};
+  const struct {
+    const char* what;
+    std::int32_t limit;
+    float radius;
+    Cells cells;
+    std::int32_t j, k;
+    std::vector<float> expected;  // the chosen values in order
+  } cases[] = {
+      // From (5, 5): d2 = 18, 1, 4, 9, 10.
+      {"exactly limit candidates stay unsorted", 3, 3, five, 5, 5, {20, 30, 40}},
+      {"more than limit: the best correlated first", 2, 3, five, 5, 5, {20, 30}},
+      {"radius 0: a cell on the node", 3, 0, five, 5, 7, {30}},
+      {"radius 0: none", 3, 0, five, 5, 5, {}},
+      // Gap 2 brings the cell on the node to the front by exchanging it with
+      // cell 0, which then stands behind cell 1.
+      {"ties at distance 1", 3, 100, {{4, 5, 1}, {5, 4, 2}, {5, 5, 3}, {5, 6, 4}, {6, 5, 5}}, 5, 5,
+       {3, 2, 1}},
+      // Beyond the cut-off (d2 81, 100: correlation 0) ranks after the positive
+      // (d2 1) and before the negative (d2 16) cell.
+      {"cut-off ranks between the signs", 2, 11, line, 0, 0, {1, 4}},
+      {"... and the later of the zeros first", 3, 11, line, 0, 0, {1, 4, 3}},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.what);
+    const RunSettings s = shortRange(c.limit, c.radius);
+    ScopedWorkspace w(static_cast<std::int32_t>(c.cells.size()), 12, 12, s);
+    w.setCells(c.cells);
+    const std::int32_t m = selectData(w.ws, c.j, c.k, s);
+    EXPECT_EQ(std::vector<float>(w.ws.selValue, w.ws.selValue + m), c.expected);
   }
-  w.setCells(x, y, v);
-  const std::int32_t m = selectData(w.ws, j, k, s);
-  return {w.ws.selValue, w.ws.selValue + m};
-}
-
-TEST(SelectData, RadiusLimitAndOrder) {
-  const std::vector<std::array<float, 3>> cells = {
-      {2, 2, 10}, {4, 5, 20}, {5, 7, 30}, {8, 5, 40}, {8, 6, 50}};
-  // Node (5, 5), radius 3: d2 = 18, 1, 4, 9, 10; three candidates in
-  // collection order, as exactly limit candidates are not sorted.
-  EXPECT_EQ(chosen(shortRange(3, 3.0f), cells, 5, 5), (std::vector<float>{20, 30, 40}));
-  // More than limit: the best-correlated first.
-  EXPECT_EQ(chosen(shortRange(2, 3.0f), cells, 5, 5), (std::vector<float>{20, 30}));
-  // SearchRadius 0: only a cell on the node; none, no choice.
-  EXPECT_EQ(chosen(shortRange(3, 0.0f), cells, 5, 7), (std::vector<float>{30}));
-  EXPECT_TRUE(chosen(shortRange(3, 0.0f), cells, 5, 5).empty());
-}
-
-TEST(SelectData, TiesAtTheCutFollowTheExchangeSort) {
-  // Four cells at distance 1 around node (5, 5) and one on it: gap 2 brings
-  // the cell on the node to the front by exchanging it with cell 0, which then
-  // stands behind cell 1.
-  EXPECT_EQ(chosen(shortRange(3), {{4, 5, 1}, {5, 4, 2}, {5, 5, 3}, {5, 6, 4}, {6, 5, 5}}, 5, 5),
-            (std::vector<float>{3, 2, 1}));
-  // Beyond the cut-off (d2 81, 100: correlation 0) ranks after the positive
-  // (d2 1) and before the negative (d2 16) cell.
-  const std::vector<std::array<float, 3>> line = {{0, 1, 1}, {0, 4, 2}, {0, 9, 3}, {0, 10, 4}};
-  EXPECT_EQ(chosen(shortRange(2, 11.0f), line, 0, 0), (std::vector<float>{1, 4}));
-  EXPECT_EQ(chosen(shortRange(3, 11.0f), line, 0, 0), (std::vector<float>{1, 4, 3}));
 }
 
 TEST(SelectData, ColumnWindowMatchesTheFullScan) {
@@ -151,22 +136,20 @@ TEST(SelectData, ColumnWindowMatchesTheFullScan) {
   // the very same choice as the scan over every cell, at every node.
   constexpr std::int32_t nj = 37, nk = 29;
   std::mt19937 random(11);
-  std::vector<float> x, y, v;
+  std::vector<std::array<float, 3>> cells;
   for (std::int32_t j = 0; j < nj; ++j) {
     for (std::int32_t k = 0; k < nk; ++k) {
-      if (random() % 8 != 0) continue;
-      x.push_back(static_cast<float>(j));
-      y.push_back(static_cast<float>(k));
-      v.push_back(static_cast<float>(random() % 1000) * 0.03f);
+      if (random() % 8 == 0)
+        cells.push_back({float(j), float(k), static_cast<float>(random() % 1000) * 0.03f});
     }
   }
-  const auto n = static_cast<std::int32_t>(x.size());
+  const auto n = static_cast<std::int32_t>(cells.size());
   for (const float radius : {0.0f, 2.5f, 4.0f, 7.3f, 100.0f}) {
     RunSettings s = testing::withLimit(6);
     s.SearchRadius = radius;
     ScopedWorkspace indexed(n, nj, nk, s), plain(n, nj, nk, s);
-    indexed.setCells(x, y, v);
-    plain.setCells(x, y, v);
+    indexed.setCells(cells);
+    plain.setCells(cells);
     workspaceIndexColumns(indexed.ws, nj);
     ASSERT_NE(indexed.ws.columnStart, nullptr);
     for (std::int32_t node = 0; node < nj * nk; ++node) {

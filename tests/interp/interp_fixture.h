@@ -9,7 +9,6 @@
 #include <vector>
 
 #include "control/log.h"
-#include "control/progress.h"
 #include "params/run_settings.h"
 #include "state/run_state.h"
 #include "support/file_description.h"
@@ -24,39 +23,29 @@ struct Observation {
   double x, y, z, value;
 };
 
-// Owns a RunState whose basic grid is nj x nk x nl with origin 0 and whose
-// local grid is the whole basic grid unless the settings say otherwise.
+// Owns a RunState whose basic grid is nj x nk x nl with origin 0, every level
+// of every column wet above a bed at `bed` (kLand: all dry); the local grid is
+// the whole basic grid, node spacing 1.
 class TestRun {
  public:
-  TestRun(std::int32_t nj, std::int32_t nk, std::int32_t nl) {
-    basic(state.basicValues, nj, nk, nl);
-    basic(state.basicBathymetry, nj, nk, nl);
-    layer(state.layerValues, nj, nk);
-    layer(state.layerBathymetry, nj, nk);
-    grid3DFill(state.basicBathymetry, static_cast<float>(kLand));
+  TestRun(std::int32_t nj, std::int32_t nk, std::int32_t nl, float bed = -50.0f) {
+    for (FloatGrid3D* g : {&state.basicValues, &state.basicBathymetry}) {
+      *g = FloatGrid3D{0, 0, 0, nj, nk, nl, 1, 1, 1, std::int64_t{nj} * nk * nl, nullptr};
+      grid3DAlloc(*g);
+    }
+    for (FloatGrid2D* g : {&state.layerValues, &state.layerBathymetry}) {
+      *g = FloatGrid2D{0, 0, nj, nk, nullptr};
+      grid2DAlloc(*g);
+    }
+    grid3DFill(state.basicBathymetry, bed);
     state.landValue = kLand;
-    settings.j0 = 0;
     settings.jx = nj - 1;
-    settings.k0 = 0;
     settings.kx = nk - 1;
-    settings.l0 = 0;
     settings.lx = nl - 1;
-    settings.dx = 1.0f;
-    settings.dy = 1.0f;
-    settings.dz = 1.0f;
+    settings.dx = settings.dy = settings.dz = 1.0f;
     settings.SearchRadius = 1000.0f;
-    settings.MaxExtrapolationDistance[0] = 0.0f;
-    settings.MaxExtrapolationDistance[1] = 0.0f;
-    settings.FilterOperations = 0;
   }
-  ~TestRun() {
-    grid3DFree(state.basicValues);
-    grid3DFree(state.basicBathymetry);
-    grid3DFree(state.localValues);
-    grid2DFree(state.layerValues);
-    grid2DFree(state.layerBathymetry);
-    scatterDataFree(state.scatter);
-  }
+  ~TestRun() { releaseAll(state); }
   TestRun(const TestRun&) = delete;
   TestRun& operator=(const TestRun&) = delete;
 
@@ -72,84 +61,38 @@ class TestRun {
     return static_cast<std::int32_t>(observations.size()) - 1;
   }
 
-  // Makes column (j, k) wet from level `fromLevel` up to the top, with the bed
-  // elevation `bed` (the bathymetry scan's picture of a water column).
-  void wetColumn(std::int32_t j, std::int32_t k, std::int32_t fromLevel, float bed) {
-    for (std::int32_t l = fromLevel; l < state.basicBathymetry.nl; ++l) {
-      state.basicBathymetry.at(j, k, l) = bed;
-    }
-  }
-  void wetEverywhere(float bed) {
-    for (std::int32_t k = 0; k < state.basicBathymetry.nk; ++k)
-      for (std::int32_t j = 0; j < state.basicBathymetry.nj; ++j) wetColumn(j, k, 0, bed);
+  // Gives column (j, k) the bed `bed` from level `fromLevel` up (the bathymetry
+  // scan's picture of a water column; kLand makes it dry).
+  void setBed(std::int32_t j, std::int32_t k, double bed, std::int32_t fromLevel = 0) {
+    for (std::int32_t l = fromLevel; l < state.basicBathymetry.nl; ++l)
+      state.basicBathymetry.at(j, k, l) = static_cast<float>(bed);
   }
 
   float value(std::int32_t j, std::int32_t k, std::int32_t l) const {
     return state.basicValues.at(j, k, l);
   }
+  std::vector<float> values() const {
+    return {state.basicValues.data, state.basicValues.data + state.basicValues.total};
+  }
 
   RunState state;
   RunSettings settings;
-
- private:
-  static void basic(FloatGrid3D& g, std::int32_t nj, std::int32_t nk, std::int32_t nl) {
-    g.nj = nj;
-    g.nk = nk;
-    g.nl = nl;
-    g.total = std::int64_t{nj} * nk * nl;
-    grid3DAlloc(g);
-  }
-  static void layer(FloatGrid2D& g, std::int32_t nj, std::int32_t nk) {
-    g.nj = nj;
-    g.nk = nk;
-    grid2DAlloc(g);
-  }
 };
 
 // Sends the log to a temporary file for the lifetime of the object.
-class LogCapture {
- public:
-  LogCapture() : file_(std::tmpfile()) { logSetStream(file_); }
+struct LogCapture {
+  LogCapture() { logSetStream(file); }
   ~LogCapture() {
     logSetStream(nullptr);
-    if (file_ != nullptr) std::fclose(file_);
+    std::fclose(file);
   }
-  LogCapture(const LogCapture&) = delete;
-  LogCapture& operator=(const LogCapture&) = delete;
-
   std::string text() const {
-    std::fflush(file_);
-    std::rewind(file_);
-    std::string out;
-    char buffer[512];
-    std::size_t n;
-    while ((n = std::fread(buffer, 1, sizeof buffer, file_)) > 0) out.append(buffer, n);
+    std::string out(1 << 16, '\0');
+    std::rewind(file);
+    out.resize(std::fread(out.data(), 1, out.size(), file));
     return out;
   }
-
- private:
-  std::FILE* file_;
-};
-
-// Counts the clock readings of the progress layer: one at every start and one
-// at every report.
-class ProgressCounter {
- public:
-  ProgressCounter() {
-    readings = 0;
-    progressSetClock(&tick);
-  }
-  ~ProgressCounter() { progressSetClock(nullptr); }
-  ProgressCounter(const ProgressCounter&) = delete;
-  ProgressCounter& operator=(const ProgressCounter&) = delete;
-
-  static inline std::int64_t readings = 0;
-
- private:
-  static std::int64_t tick() {
-    ++readings;
-    return 0;
-  }
+  std::FILE* file = std::tmpfile();
 };
 
 }  // namespace karnet::testing

@@ -8,6 +8,7 @@
 #include <cmath>
 #include <cstdint>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "interp/smooth_layer.h"
@@ -19,86 +20,90 @@ namespace {
 using testing::kEmpty;
 using testing::kLand;
 using testing::LogCapture;
-using testing::ProgressCounter;
+using testing::Observation;
 using testing::TestRun;
 
 std::string statisticsBlock(int bilinear, int weighted, int none) {
-  return "\n-------------------------------------------------\n"
-         "Statistics for local grid:\n"
-         "\n"
+  const std::string rule = "-------------------------------------------------\n";
+  return "\n" + rule + "Statistics for local grid:\n\n" +
          "No. of bilinear interpolations          : " + std::to_string(bilinear) + "\n" +
          "No. of distance weighted interpolations : " + std::to_string(weighted) + "\n" +
-         "No. of no interpolations                : " + std::to_string(none) + "\n" +
-         "-------------------------------------------------\n"
-         "\n";
+         "No. of no interpolations                : " + std::to_string(none) + "\n" + rule + "\n";
 }
 
-std::vector<float> row(const TestRun& run, std::int32_t k, std::int32_t l) {
-  std::vector<float> out;
-  for (std::int32_t j = 0; j < run.state.basicValues.nj; ++j) out.push_back(run.value(j, k, l));
-  return out;
-}
-
-void makeDry(TestRun& run, std::int32_t j, std::int32_t k) {
-  for (std::int32_t l = 0; l < run.state.basicBathymetry.nl; ++l) {
-    run.state.basicBathymetry.at(j, k, l) = static_cast<float>(kLand);
+TEST(Interp, FillsTheFootprintOfTheLocalLevelsAndCountsIt) {
+  // One row of nj nodes on nl basic levels, node spacing 100.
+  const float E = kEmpty, far = 1e5f;
+  const struct {
+    const char* what;
+    std::int32_t nj, nl;
+    std::vector<Observation> observations;
+    std::vector<std::int32_t> dry;  // dry columns
+    std::int32_t jOff, lOff, jx, l0, lx, filterOperations;
+    float searchRadius;
+    std::vector<float> expected;  // the basic grid before smoothing
+    int weighted, none;           // counts in the statistics block (no bilinear ones)
+  } cases[] = {
+      {"single hit at distance two, across a dry node", 3, 1, {{2, 0, 0, 0.3}}, {1}, 0, 0, 2, 0, 0,
+       0, far, {0.3f, E, 0.3f}, 1, 0},
+      // A binned observation in a dry node is data for its wet neighbours, then
+      // removed; a dry node without data is neither interpolated nor counted.
+      {"dry nodes emptied after serving as data", 4, 1, {{1, 0, 0, 5}}, {1, 3}, 0, 0, 3, 0, 0, 0,
+       far, {5, E, 5, E}, 2, 0},
+      {"reach is SearchRadius over dx", 4, 1, {{0, 0, 0, 5}}, {}, 0, 0, 3, 0, 0, 0, 150,
+       {5, 5, E, E}, 1, 2},
+      // Basic levels 0..3; local levels 5..6 sit at basic levels 1..2.
+      {"only the local levels", 3, 4, {{0, 0, 0, 10}, {0, 0, 1, 20}, {0, 0, 2, 30}, {0, 0, 3, 40}},
+       {}, 0, 1, 2, 5, 6, 0, far, {10, E, E, 20, 20, 20, 30, 30, 30, 40, E, E}, 4, 0},
+      {"a single local level", 2, 3, {{0, 0, 2, 1.5}}, {}, 0, 2, 1, 2, 2, 0, far,
+       {E, E, E, E, 1.5f, 1.5f}, 1, 0},
+      // Local footprint: columns 1..3 of 6.
+      {"only the footprint, unsmoothed", 6, 1, {{0, 0, 0, 0}, {1, 0, 0, 12}}, {}, 1, 0, 2, 0, 0,
+       -3, far, {0, 12, 12, 12, E, E}, 2, 0},
+      {"the whole layer smoothed", 6, 1, {{0, 0, 0, 0}, {1, 0, 0, 12}}, {}, 1, 0, 2, 0, 0, 2, far,
+       {0, 12, 12, 12, E, E}, 2, 0},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.what);
+    TestRun run(c.nj, 1, c.nl);
+    for (std::int32_t j : c.dry) run.setBed(j, 0, kLand);
+    run.settings.jx = c.jx;
+    run.settings.l0 = c.l0;
+    run.settings.lx = c.lx;
+    run.settings.FilterOperations = c.filterOperations;
+    run.settings.SearchRadius = c.searchRadius;
+    run.settings.dx = 100.0f;
+    LogCapture log;
+    interp(run.observe(c.observations), c.jOff, 0, c.lOff, run.state, run.settings);
+    std::vector<float> expected = c.expected;
+    for (int i = 0; i < c.filterOperations; ++i) smoothLayer(expected.data(), c.nj, 1);
+    EXPECT_EQ(run.values(), expected);
+    EXPECT_EQ(log.text(), statisticsBlock(0, c.weighted, c.none));
   }
 }
 
-TEST(Interp, FourNeighboursReproduceAPlane) {
-  TestRun run(5, 5, 1);
-  run.wetEverywhere(-50.0f);
-  // f = 5 + 2*dj + 3*dk around (2, 2)
-  const std::int32_t last =
-      run.observe({{3, 2, 0, 7.0}, {2, 3, 0, 8.0}, {1, 2, 0, 3.0}, {2, 1, 0, 2.0}});
-  LogCapture log;
-  interp(last, 0, 0, 0, run.state, run.settings);
-  EXPECT_EQ(run.value(2, 2, 0), 5.0f);
-  EXPECT_EQ(run.value(3, 2, 0), 7.0f);  // data nodes keep their values
-  EXPECT_EQ(run.value(2, 1, 0), 2.0f);
-  for (std::int32_t k = 0; k < 5; ++k)
-    for (std::int32_t j = 0; j < 5; ++j) EXPECT_NE(run.value(j, k, 0), kEmpty) << j << "," << k;
-}
-
-TEST(Interp, StatisticsBlockCountsOverAllLayers) {
-  // Layer 0: the centre has four neighbours (bilinear), three corners two
-  // (distance weighted), the fourth corner is dry. Layer 1 is empty: its eight
-  // wet nodes find nothing.
+TEST(Interp, FourNeighboursReproduceAPlaneAndTheCountsCoverAllLayers) {
+  // Layer 0 holds f = 5 + 2j + 3k at the four neighbours of its centre, which
+  // is interpolated bilinearly; three corners have two neighbours (distance
+  // weighted), the fourth is dry. Layer 1 is empty: its eight wet nodes find nothing.
   TestRun run(3, 3, 2);
-  run.wetEverywhere(-50.0f);
-  makeDry(run, 2, 2);
-  const std::int32_t last =
-      run.observe({{2, 1, 0, 1.0}, {1, 2, 0, 2.0}, {0, 1, 0, 3.0}, {1, 0, 0, 4.0}});
+  run.setBed(2, 2, kLand);
+  const std::int32_t last = run.observe({{2, 1, 0, 12}, {1, 2, 0, 13}, {0, 1, 0, 8}, {1, 0, 0, 7}});
   LogCapture log;
-  ProgressCounter progress;
   interp(last, 0, 0, 0, run.state, run.settings);
   EXPECT_EQ(log.text(), statisticsBlock(1, 3, 8));
-  EXPECT_EQ(run.value(1, 1, 0), 2.5f);
+  EXPECT_EQ(run.value(1, 1, 0), 10.0f);
+  EXPECT_EQ(run.value(2, 1, 0), 12.0f);  // data nodes keep their values
   EXPECT_EQ(run.value(2, 2, 0), kEmpty);
-  EXPECT_EQ(row(run, 1, 1), std::vector<float>(3, kEmpty));
-  // Gridding: one start, reports at 4, 8, .., 48 of its 49 units; then one
-  // start and one report per layer.
-  EXPECT_EQ(ProgressCounter::readings, 13 + 3);
-}
-
-TEST(Interp, SingleHitAtDistanceTwoGivesItsValue) {
-  TestRun run(3, 1, 1);
-  run.wetEverywhere(-50.0f);
-  makeDry(run, 1, 0);  // the node in between takes no part
-  const std::int32_t last = run.observe({{2, 0, 0, 0.3}});
-  LogCapture log;
-  interp(last, 0, 0, 0, run.state, run.settings);
-  EXPECT_EQ(row(run, 0, 0), (std::vector<float>{0.3f, kEmpty, 0.3f}));
-  EXPECT_EQ(log.text(), statisticsBlock(0, 1, 0));
+  const std::vector<float> all = run.values();
+  EXPECT_EQ(std::vector<float>(all.begin() + 9, all.end()), std::vector<float>(9, kEmpty));
 }
 
 TEST(Interp, EstimatesReadTheLayerAsItWasBeforeItsPass) {
   // 3 x 2 layer with data at (0, 0) = 0 and (2, 1) = 12.
   TestRun run(3, 2, 1);
-  run.wetEverywhere(-50.0f);
-  const std::int32_t last = run.observe({{0, 0, 0, 0.0}, {2, 1, 0, 12.0}});
   LogCapture log;
-  interp(last, 0, 0, 0, run.state, run.settings);
+  interp(run.observe({{0, 0, 0, 0.0}, {2, 1, 0, 12.0}}), 0, 0, 0, run.state, run.settings);
   const float diagonal = static_cast<float>(1.0 / std::sqrt(2.0));
   // (1, 0): Q1 (2, 1) diagonal, Q3 (0, 0) one away.
   const float n10 = (diagonal * 12.0f + 1.0f * 0.0f) / (diagonal + 1.0f);
@@ -109,108 +114,8 @@ TEST(Interp, EstimatesReadTheLayerAsItWasBeforeItsPass) {
   const float n01 = (0.5f * 12.0f + 1.0f * 0.0f) / (0.5f + 1.0f);
   // (1, 1): Q1 (2, 1) one away, Q3 (0, 0) diagonal.
   const float n11 = (1.0f * 12.0f + diagonal * 0.0f) / (1.0f + diagonal);
-  EXPECT_EQ(row(run, 0, 0), (std::vector<float>{0.0f, n10, n20}));
-  EXPECT_EQ(row(run, 1, 0), (std::vector<float>{n01, n11, 12.0f}));
+  EXPECT_EQ(run.values(), (std::vector<float>{0.0f, n10, n20, n01, n11, 12.0f}));
   EXPECT_EQ(log.text(), statisticsBlock(0, 4, 0));
-}
-
-TEST(Interp, DryNodesAreEmptiedAfterServingAsData) {
-  // A binned observation in a dry node is still data for its wet neighbours
-  // during the layer's pass, and is removed afterwards. A dry node without
-  // data is neither interpolated nor counted.
-  TestRun run(4, 1, 1);
-  run.wetEverywhere(-50.0f);
-  makeDry(run, 1, 0);
-  makeDry(run, 3, 0);
-  const std::int32_t last = run.observe({{1, 0, 0, 5.0}});
-  LogCapture log;
-  interp(last, 0, 0, 0, run.state, run.settings);
-  EXPECT_EQ(row(run, 0, 0), (std::vector<float>{5.0f, kEmpty, 5.0f, kEmpty}));
-  EXPECT_EQ(log.text(), statisticsBlock(0, 2, 0));
-}
-
-TEST(Interp, ReachIsSearchRadiusOverDx) {
-  TestRun run(4, 1, 1);
-  run.wetEverywhere(-50.0f);
-  run.settings.SearchRadius = 150.0f;
-  run.settings.dx = 100.0f;
-  const std::int32_t last = run.observe({{0, 0, 0, 5.0}});
-  LogCapture log;
-  interp(last, 0, 0, 0, run.state, run.settings);
-  EXPECT_EQ(row(run, 0, 0), (std::vector<float>{5.0f, 5.0f, kEmpty, kEmpty}));
-  EXPECT_EQ(log.text(), statisticsBlock(0, 1, 2));
-}
-
-TEST(Interp, OnlyTheLocalLevelsAreWorked) {
-  // Basic levels 0..3; local levels 5..6 sit at basic levels 1..2.
-  TestRun run(3, 1, 4);
-  run.wetEverywhere(-50.0f);
-  run.settings.l0 = 5;
-  run.settings.lx = 6;
-  const std::int32_t last =
-      run.observe({{0, 0, 0, 10.0}, {0, 0, 1, 20.0}, {0, 0, 2, 30.0}, {0, 0, 3, 40.0}});
-  LogCapture log;
-  interp(last, 0, 0, 1, run.state, run.settings);
-  EXPECT_EQ(row(run, 0, 0), (std::vector<float>{10.0f, kEmpty, kEmpty}));
-  EXPECT_EQ(row(run, 0, 1), (std::vector<float>{20.0f, 20.0f, 20.0f}));
-  EXPECT_EQ(row(run, 0, 2), (std::vector<float>{30.0f, 30.0f, 30.0f}));
-  EXPECT_EQ(row(run, 0, 3), (std::vector<float>{40.0f, kEmpty, kEmpty}));
-  EXPECT_EQ(log.text(), statisticsBlock(0, 4, 0));
-}
-
-TEST(Interp, SingleLocalLevelIsStillWorked) {
-  TestRun run(2, 1, 3);
-  run.wetEverywhere(-50.0f);
-  run.settings.l0 = 2;
-  run.settings.lx = 2;
-  const std::int32_t last = run.observe({{0, 0, 2, 1.5}});
-  LogCapture log;
-  interp(last, 0, 0, 2, run.state, run.settings);
-  EXPECT_EQ(row(run, 0, 2), (std::vector<float>{1.5f, 1.5f}));
-  EXPECT_EQ(log.text(), statisticsBlock(0, 1, 0));
-}
-
-// A 6 x 1 basic layer whose local footprint is columns 1..3.
-class InterpFootprint : public ::testing::Test {
- protected:
-  InterpFootprint() : run(6, 1, 1) {
-    run.wetEverywhere(-50.0f);
-    run.settings.jx = 2;
-  }
-  std::vector<float> analyse(std::int32_t filterOperations) {
-    run.settings.FilterOperations = filterOperations;
-    const std::int32_t last = run.observe({{0, 0, 0, 0.0}, {1, 0, 0, 12.0}});
-    interp(last, 1, 0, 0, run.state, run.settings);
-    return row(run, 0, 0);
-  }
-  LogCapture log;
-  TestRun run;
-};
-
-TEST_F(InterpFootprint, NodesOutsideAreNotInterpolated) {
-  EXPECT_EQ(analyse(0), (std::vector<float>{0.0f, 12.0f, 12.0f, 12.0f, kEmpty, kEmpty}));
-  EXPECT_EQ(log.text(), statisticsBlock(0, 2, 0));
-}
-
-TEST_F(InterpFootprint, WholeLayerIsSmoothedFilterOperationsTimes) {
-  std::vector<float> expected = {0.0f, 12.0f, 12.0f, 12.0f, kEmpty, kEmpty};
-  smoothLayer(expected.data(), 6, 1);
-  smoothLayer(expected.data(), 6, 1);
-  EXPECT_EQ(analyse(2), expected);
-}
-
-TEST_F(InterpFootprint, NegativeFilterOperationsMeansNoSmoothing) {
-  EXPECT_EQ(analyse(-3), (std::vector<float>{0.0f, 12.0f, 12.0f, 12.0f, kEmpty, kEmpty}));
-}
-
-TEST(Interp, NothingToFillGivesZeroCounts) {
-  TestRun run(2, 2, 1);
-  run.wetEverywhere(-50.0f);
-  makeDry(run, 1, 1);
-  const std::int32_t last = run.observe({{0, 0, 0, 1.0}, {1, 0, 0, 2.0}, {0, 1, 0, 3.0}});
-  LogCapture log;
-  interp(last, 0, 0, 0, run.state, run.settings);
-  EXPECT_EQ(log.text(), statisticsBlock(0, 0, 0));
 }
 
 }  // namespace

@@ -13,231 +13,96 @@ namespace karnet {
 namespace {
 
 using testing::kEmpty;
-using testing::ProgressCounter;
+using testing::kLand;
+using testing::Observation;
 using testing::TestRun;
 
-// Levels of column (j, k) from the bottom up.
-std::vector<float> column(const TestRun& run, std::int32_t j, std::int32_t k) {
-  std::vector<float> out;
-  for (std::int32_t l = 0; l < run.state.basicValues.nl; ++l) out.push_back(run.value(j, k, l));
-  return out;
-}
-
-std::int64_t dataNodes(const TestRun& run) {
-  std::int64_t n = 0;
-  const FloatGrid3D& v = run.state.basicValues;
-  for (std::int64_t i = 0; i < v.total; ++i) n += v.data[i] != kEmpty ? 1 : 0;
-  return n;
-}
-
-TEST(SetadjBinning, HalvesRoundUpAndOthersStayEmpty) {
-  TestRun run(8, 2, 1);
-  run.wetEverywhere(-50.0f);
-  const std::int32_t last = run.observe({{4.5, 0.0, 0.0, 7.0}, {4.49, 1.0, 0.2, 3.0}});
-  setadj(last, run.state, run.settings);
-  EXPECT_EQ(run.value(5, 0, 0), 7.0f);
-  EXPECT_EQ(run.value(4, 0, 0), kEmpty);
-  EXPECT_EQ(run.value(4, 1, 0), 3.0f);
-  EXPECT_EQ(dataNodes(run), 2);
-}
-
-TEST(SetadjBinning, ObservationsSharingANodeAreAveraged) {
-  TestRun run(4, 4, 1);
-  run.wetEverywhere(-50.0f);
-  const std::int32_t last = run.observe({{2.2, 0.9, 0.1, 1.0},
-                                         {1.6, 1.4, -0.3, 2.0},
-                                         {2.49, 1.49, 0.49, 4.0},
-                                         {0.0, 0.0, 0.0, 10.0}});
-  setadj(last, run.state, run.settings);
-  EXPECT_EQ(run.value(2, 1, 0), 7.0f / 3.0f);
-  EXPECT_EQ(run.value(0, 0, 0), 10.0f);
-  EXPECT_EQ(dataNodes(run), 2);
-}
-
-TEST(SetadjBinning, SumIsFormedInDoubleAndRoundedAtEachStep) {
-  TestRun run(1, 1, 1);
-  run.wetEverywhere(-50.0f);
-  // 2^24 + 1 is not a float; added in double to 1.0f it gives 2^24 + 2, which is.
-  const std::int32_t last = run.observe({{0, 0, 0, 1.0}, {0, 0, 0, 16777217.0}});
-  setadj(last, run.state, run.settings);
-  EXPECT_EQ(run.value(0, 0, 0), 16777218.0f / 2.0f);
-}
-
-TEST(SetadjBinning, NoObservationsLeavesEverythingEmpty) {
-  TestRun run(3, 3, 4);
-  run.wetEverywhere(-50.0f);
-  run.settings.MaxExtrapolationDistance[0] = 1000.0f;
-  run.settings.MaxExtrapolationDistance[1] = 1000.0f;
-  grid3DFill(run.state.basicValues, 5.0f);  // stale content is discarded
-  setadj(-1, run.state, run.settings);
-  EXPECT_EQ(dataNodes(run), 0);
-}
-
-TEST(SetadjBinning, ObservationOutsideTheBasicGridIsSkipped) {
-  TestRun run(3, 3, 2);
-  run.wetEverywhere(-50.0f);
-  const std::int32_t last = run.observe(
-      {{-2.0, 1.0, 0.0, 9.0}, {1.0, 3.6, 0.0, 9.0}, {1.0, 1.0, 7.0, 9.0}, {1.0, 1.0, 1.0, 4.0}});
-  setadj(last, run.state, run.settings);
-  EXPECT_EQ(run.value(1, 1, 1), 4.0f);
-  EXPECT_EQ(dataNodes(run), 1);
-}
-
-TEST(SetadjColumns, ZeroValuedObservationIsDataAndClosesAGap) {
-  TestRun run(1, 1, 3);
-  run.wetEverywhere(-50.0f);
-  const std::int32_t last = run.observe({{0, 0, 0, 0.0}, {0, 0, 2, 6.0}});
-  setadj(last, run.state, run.settings);
-  EXPECT_EQ(column(run, 0, 0), (std::vector<float>{0.0f, 3.0f, 6.0f}));
-}
-
-TEST(SetadjColumns, InteriorGapGetsLinearWeights) {
-  TestRun run(2, 1, 8);
-  run.wetEverywhere(-100.0f);
-  const float a = 0.3f, b = 1.7f;
-  const std::int32_t last = run.observe({{1, 0, 2, a}, {1, 0, 6, b}});
-  setadj(last, run.state, run.settings);
-  const std::vector<float> expected = {kEmpty,
-                                       kEmpty,
-                                       a,
-                                       0.25f * b + 0.75f * a,
-                                       0.5f * b + 0.5f * a,
-                                       0.75f * b + 0.25f * a,
-                                       b,
-                                       kEmpty};
-  EXPECT_EQ(column(run, 1, 0), expected);
-  // The neighbouring column without data stays empty.
-  EXPECT_EQ(column(run, 0, 0), std::vector<float>(8, kEmpty));
-}
-
-TEST(SetadjColumns, SeveralGapsAreClosedWhateverTheirLength) {
-  TestRun run(1, 1, 9);
-  run.wetEverywhere(-100.0f);
-  const std::int32_t last = run.observe({{0, 0, 0, 2.0}, {0, 0, 1, 4.0}, {0, 0, 3, 8.0}, {0, 0, 8, 3.0}});
-  setadj(last, run.state, run.settings);
-  const std::vector<float> expected = {2.0f, 4.0f, 6.0f, 8.0f,
-                                       0.2f * 3.0f + 0.8f * 8.0f,
-                                       0.4f * 3.0f + 0.6f * 8.0f,
-                                       0.6f * 3.0f + 0.4f * 8.0f,
-                                       0.8f * 3.0f + 0.2f * 8.0f,
-                                       3.0f};
-  EXPECT_EQ(column(run, 0, 0), expected);
-}
-
-// Column of six levels, top level (5) at height -1, bed at -6.5: the top lies
-// 5.5 above the bed.
-class SetadjUpward : public ::testing::Test {
- protected:
-  SetadjUpward() : run(1, 1, 6) { run.wetEverywhere(-6.5f); }
-  std::vector<float> complete(float maxUp, std::int32_t level) {
-    run.settings.MaxExtrapolationDistance[0] = maxUp;
-    setadj(run.observe({{0, 0, static_cast<double>(level), 2.5}}), run.state, run.settings);
-    return column(run, 0, 0);
+TEST(Setadj, BinsToTheNearestNodeAndAveragesSharedNodes) {
+  const struct {
+    const char* what;
+    std::int32_t nj, nk, nl;
+    std::vector<Observation> observations;
+    std::vector<Observation> expected;  // (j, k, l, value) of every node holding data afterwards
+  } cases[] = {
+      {"halves round up", 8, 2, 1, {{4.5, 0, 0, 7}, {4.49, 1, 0.2, 3}},
+       {{5, 0, 0, 7}, {4, 1, 0, 3}}},
+      {"shared nodes averaged", 4, 4, 1,
+       {{2.2, 0.9, 0.1, 1}, {1.6, 1.4, -0.3, 2}, {2.49, 1.49, 0.49, 4}, {0, 0, 0, 10}},
+       {{0, 0, 0, 10}, {2, 1, 0, 7.0f / 3.0f}}},
+      // 2^24 + 1 is not a float; added in double to 1.0f it gives 2^24 + 2, which is.
+      {"sum in double, rounded at each step", 1, 1, 1, {{0, 0, 0, 1}, {0, 0, 0, 16777217.0}},
+       {{0, 0, 0, 16777218.0f / 2.0f}}},
+      {"outside the basic grid skipped", 3, 3, 2,
+       {{-2, 1, 0, 9}, {1, 3.6, 0, 9}, {1, 1, 7, 9}, {1, 1, 1, 4}}, {{1, 1, 1, 4}}},
+      {"no observations", 3, 3, 4, {}, {}},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.what);
+    TestRun run(c.nj, c.nk, c.nl);
+    grid3DFill(run.state.basicValues, 5.0f);  // stale content is discarded
+    setadj(run.observe(c.observations), run.state, run.settings);
+    std::vector<float> expected(static_cast<std::size_t>(run.state.basicValues.total), kEmpty);
+    for (const Observation& n : c.expected)
+      expected[run.state.basicValues.index(int(n.x), int(n.y), int(n.z))] = float(n.value);
+    EXPECT_EQ(run.values(), expected);
   }
-  TestRun run;
-};
-
-TEST_F(SetadjUpward, ExtendsWhenTheTopLiesCloseEnoughAboveTheBed) {
-  EXPECT_EQ(complete(5.6f, 2), (std::vector<float>{kEmpty, kEmpty, 2.5f, 2.5f, 2.5f, 2.5f}));
 }
 
-TEST_F(SetadjUpward, BoundIsStrict) {
-  EXPECT_EQ(complete(5.5f, 2), (std::vector<float>{kEmpty, kEmpty, 2.5f, kEmpty, kEmpty, kEmpty}));
-}
-
-TEST_F(SetadjUpward, JudgedOnTheTopLevelNotOnTheDistanceToTheData) {
-  // The data lie one level below the top, yet the top is 5.5 above the bed.
-  EXPECT_EQ(complete(2.0f, 4), (std::vector<float>{kEmpty, kEmpty, kEmpty, kEmpty, 2.5f, kEmpty}));
-}
-
-// Twelve levels at heights -12 .. -1, bed at -6.5: wet from level 6 (height -6).
-class SetadjDownward : public ::testing::Test {
- protected:
-  SetadjDownward() : run(1, 1, 12) { run.wetColumn(0, 0, 6, -6.5f); }
-  std::vector<float> complete(float maxDown, std::int32_t level) {
-    run.settings.MaxExtrapolationDistance[1] = maxDown;
-    setadj(run.observe({{0, 0, static_cast<double>(level), -1.25}}), run.state, run.settings);
-    return column(run, 0, 0);
+TEST(Setadj, ClosesGapsAndExtendsColumnsWithinTheirLimits) {
+  // A single column. Level l lies at (l - lx - 1) * dz; a column wet from level
+  // `wetFrom` holds its bed elevation there, landValue below.
+  const float E = kEmpty, a = 0.3f, b = 1.7f, v = -1.25f;
+  const struct {
+    const char* what;
+    std::int32_t nl, wetFrom, lx;
+    float dz, bed, maxUp, maxDown;
+    std::vector<Observation> observations;
+    std::vector<float> expected;
+  } cases[] = {
+      {"a zero value is data", 3, 0, 2, 1, -100, 0, 0, {{0, 0, 0, 0}, {0, 0, 2, 6}}, {0, 3, 6}},
+      {"interior gap", 8, 0, 7, 1, -100, 0, 0, {{0, 0, 2, a}, {0, 0, 6, b}},
+       {E, E, a, 0.25f * b + 0.75f * a, 0.5f * b + 0.5f * a, 0.75f * b + 0.25f * a, b, E}},
+      {"several gaps", 9, 0, 8, 1, -100, 0, 0,
+       {{0, 0, 0, 2}, {0, 0, 1, 4}, {0, 0, 3, 8}, {0, 0, 8, 3}},
+       {2, 4, 6, 8, 0.2f * 3 + 0.8f * 8, 0.4f * 3 + 0.6f * 8, 0.6f * 3 + 0.4f * 8,
+        0.8f * 3 + 0.2f * 8, 3}},
+      // Six levels at -6 .. -1 above a bed at -6.5: the top lies 5.5 above it.
+      {"up: top close enough above the bed", 6, 0, 5, 1, -6.5f, 5.6f, 0, {{0, 0, 2, v}},
+       {E, E, v, v, v, v}},
+      {"up: the bound is strict", 6, 0, 5, 1, -6.5f, 5.5f, 0, {{0, 0, 2, v}}, {E, E, v, E, E, E}},
+      {"up: judged on the top level, not the data", 6, 0, 5, 1, -6.5f, 2, 0, {{0, 0, 4, v}},
+       {E, E, E, E, v, E}},
+      // With lx = 3 and dz = 2 the top level 5 is at +2, 7 above a bed at -5.
+      {"up: heights follow the local top level", 6, 0, 3, 2, -5, 7.5f, 0, {{0, 0, 3, v}},
+       {E, E, E, v, v, v}},
+      {"up: ... strictly", 6, 0, 3, 2, -5, 7, 0, {{0, 0, 3, v}}, {E, E, E, v, E, E}},
+      // Twelve levels at -12 .. -1, wet from level 6 above a bed at -6.5: data
+      // at level 8 (height -4) lie 2.5 above the bed.
+      {"down: truncated level count, trunc(6 - 2.6)", 12, 6, 11, 1, -6.5f, 0, 2.6f, {{0, 0, 8, v}},
+       {E, E, E, v, v, v, v, v, v, E, E, E}},
+      {"down: stops at the bottom", 12, 6, 11, 1, -6.5f, 0, 20, {{0, 0, 8, v}},
+       {v, v, v, v, v, v, v, v, v, E, E, E}},
+      {"down: data too high above the bed", 12, 6, 11, 1, -6.5f, 0, 2.5f, {{0, 0, 8, v}},
+       {E, E, E, E, E, E, E, E, v, E, E, E}},
+      // Data in the bed: its height above the bed is measured against landValue
+      // and passes; it extends from its own level, trunc(4 - 1.5).
+      {"down: data below the bed", 12, 6, 11, 1, -6.5f, 0, 1.5f, {{0, 0, 4, v}},
+       {E, E, v, v, v, E, E, E, E, E, E, E}},
+      // All dry: the top's height above the "bed" passes the upward test even at 0.
+      {"dry column, trunc(5 - 2.5)", 8, 8, 7, 1, 0, 0, 2.5f, {{0, 0, 5, v}},
+       {E, E, v, v, v, v, v, v}},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.what);
+    TestRun run(1, 1, c.nl, static_cast<float>(kLand));
+    run.setBed(0, 0, c.bed, c.wetFrom);
+    run.settings.lx = c.lx;
+    run.settings.dz = c.dz;
+    run.settings.MaxExtrapolationDistance[0] = c.maxUp;
+    run.settings.MaxExtrapolationDistance[1] = c.maxDown;
+    setadj(run.observe(c.observations), run.state, run.settings);
+    EXPECT_EQ(run.values(), c.expected);
   }
-  TestRun run;
-};
-
-TEST_F(SetadjDownward, ReachesIntoTheBedByTruncatedLevelCount) {
-  // Data at height -4, 2.5 above the bed; lstart = trunc(6 - 2.6) = 3.
-  std::vector<float> expected(12, kEmpty);
-  for (int l = 3; l <= 8; ++l) expected[l] = -1.25f;
-  EXPECT_EQ(complete(2.6f, 8), expected);
-}
-
-TEST_F(SetadjDownward, StartsAtTheBottomWhenTheReachGoesBelowIt) {
-  std::vector<float> expected(12, kEmpty);
-  for (int l = 0; l <= 8; ++l) expected[l] = -1.25f;
-  EXPECT_EQ(complete(20.0f, 8), expected);
-}
-
-TEST_F(SetadjDownward, DataTooHighAboveTheBedIsNotExtended) {
-  std::vector<float> expected(12, kEmpty);
-  expected[8] = -1.25f;
-  EXPECT_EQ(complete(2.5f, 8), expected);
-}
-
-TEST_F(SetadjDownward, DataBelowTheBedExtendsFromItsOwnLevel) {
-  // Data in the bed at level 4: first = 4, lstart = trunc(4 - 1.5) = 2; its
-  // "height above the bed" is measured against the land value and passes.
-  std::vector<float> expected(12, kEmpty);
-  for (int l = 2; l <= 4; ++l) expected[l] = -1.25f;
-  EXPECT_EQ(complete(1.5f, 4), expected);
-}
-
-TEST(SetadjColumns, DryColumnExtendsFromItsData) {
-  TestRun run(1, 1, 8);  // land everywhere
-  run.settings.MaxExtrapolationDistance[1] = 2.5f;
-  const std::int32_t last = run.observe({{0, 0, 5, 9.0}});
-  setadj(last, run.state, run.settings);
-  // lstart = trunc(5 - 2.5) = 2. The top level's "height above the bed" is
-  // measured against the land value, so the upward test passes even at 0.
-  const std::vector<float> expected = {kEmpty, kEmpty, 9.0f, 9.0f, 9.0f, 9.0f, 9.0f, 9.0f};
-  EXPECT_EQ(column(run, 0, 0), expected);
-}
-
-TEST(SetadjColumns, HeightsFollowTheLocalTopLevel) {
-  // Basic level l lies at (l - lx - 1) * dz whatever the basic grid's depth:
-  // with lx = 3 and dz = 2 the top basic level 5 is at +2, 7 above a bed at -5.
-  TestRun run(1, 1, 6);
-  run.wetEverywhere(-5.0f);
-  run.settings.lx = 3;
-  run.settings.dz = 2.0f;
-  run.settings.MaxExtrapolationDistance[0] = 7.5f;
-  setadj(run.observe({{0, 0, 3, 1.0}}), run.state, run.settings);
-  EXPECT_EQ(column(run, 0, 0), (std::vector<float>{kEmpty, kEmpty, kEmpty, 1.0f, 1.0f, 1.0f}));
-
-  TestRun strict(1, 1, 6);
-  strict.wetEverywhere(-5.0f);
-  strict.settings.lx = 3;
-  strict.settings.dz = 2.0f;
-  strict.settings.MaxExtrapolationDistance[0] = 7.0f;
-  setadj(strict.observe({{0, 0, 3, 1.0}}), strict.state, strict.settings);
-  EXPECT_EQ(column(strict, 0, 0), (std::vector<float>{kEmpty, kEmpty, kEmpty, 1.0f, kEmpty, kEmpty}));
-}
-
-TEST(SetadjProgress, ReportsEveryTenthOfTheWork) {
-  ProgressCounter progress;
-  TestRun run(4, 3, 2);
-  run.wetEverywhere(-50.0f);
-  const std::int32_t last = run.observe({{0, 0, 0, 1.0}, {1, 1, 1, 2.0}});
-  setadj(last, run.state, run.settings);
-  // total = (2*2 + 1)*3*4 + 1 = 61, step 6; the counter runs to 62: one start
-  // and reports at 6, 12, .., 60.
-  EXPECT_EQ(ProgressCounter::readings, 1 + 10);
-}
-
-TEST(SetadjProgress, TinyRunReportsEveryUnit) {
-  ProgressCounter progress;
-  TestRun run(1, 1, 1);
-  run.wetEverywhere(-50.0f);
-  setadj(-1, run.state, run.settings);
-  // total = 3 - 1 = 2 units (step below one, taken as one); the counter runs to 3.
-  EXPECT_EQ(ProgressCounter::readings, 1 + 3);
 }
 
 }  // namespace

@@ -3,9 +3,9 @@
 
 #include <gtest/gtest.h>
 
-#include <cstdio>
 #include <cstdlib>
 #include <filesystem>
+#include <fstream>
 #include <string>
 
 namespace karnet::test {
@@ -14,36 +14,23 @@ namespace karnet::test {
 // with everything in it.
 class TempDir {
  public:
-  TempDir() {
-    std::string pattern = (std::filesystem::temp_directory_path() / "karnet-par-XXXXXX").string();
-    if (mkdtemp(pattern.data()) == nullptr) ADD_FAILURE() << "mkdtemp failed";
-    path_ = pattern;
+  TempDir() : path_((std::filesystem::temp_directory_path() / "karnet-par-XXXXXX").string()) {
+    if (mkdtemp(path_.data()) == nullptr) ADD_FAILURE() << "mkdtemp failed";
   }
-  ~TempDir() {
-    std::error_code ignored;
-    std::filesystem::remove_all(path_, ignored);
-  }
-  TempDir(const TempDir&) = delete;
-  TempDir& operator=(const TempDir&) = delete;
+  ~TempDir() { std::filesystem::remove_all(path_, ignored_); }
 
   const std::string& path() const { return path_; }
   std::string file(const std::string& name) const { return path_ + "/" + name; }
 
   // Writes text as it is (no line-end translation) and gives the path.
   std::string write(const std::string& name, const std::string& text) const {
-    const std::string full = file(name);
-    std::FILE* stream = std::fopen(full.c_str(), "wb");
-    if (stream == nullptr) {
-      ADD_FAILURE() << "cannot create " << full;
-      return full;
-    }
-    std::fwrite(text.data(), 1, text.size(), stream);
-    std::fclose(stream);
-    return full;
+    std::ofstream(file(name), std::ios::binary) << text;
+    return file(name);
   }
 
  private:
   std::string path_;
+  std::error_code ignored_;
 };
 
 }  // namespace karnet::test

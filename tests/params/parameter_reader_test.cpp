@@ -4,8 +4,10 @@
 
 #include <algorithm>
 #include <cstdio>
-#include <cstring>
+#include <cstdlib>
 #include <string>
+#include <tuple>
+#include <utility>
 
 #include "control/log.h"
 #include "par_test_util.h"
@@ -13,8 +15,6 @@
 
 namespace karnet {
 namespace {
-
-using test::TempDir;
 
 // A parameter file with every section and keyword.
 const std::string kComplete =
@@ -51,323 +51,231 @@ const std::string kComplete =
     "   EndSect  // OUTPUT_DATA\n"
     "EndSect  // Q4_DIGITIZING_OF_DATA\n";
 
-const std::string kRule =
-    "======================================================================\n";
-
-// The echo of each section of kComplete read from directory dir.
-std::string echoTarget() { return kRule + "TARGET: Q4_DIGITIZING_OF_DATA\n"; }
-std::string echoInputFiles(const std::string& dir) {
-  return "\tsection: INPUT_FILES ---------------------------------\n"
-         "\t\tFileName : " + dir + "/bathymetry.nc\n"
-         "\t\tDataFileName : " + dir + "/observations.txt\n"
-         "\t\tProjection: UTM-32\n";
-}
-const std::string kEchoGrid =
-    "\tsection : DESCRIPTION_OF_GRID ------------------------\n"
-    "\t\tZRange : 0, 19\n"
-    "\t\tSpacing : 2.500000\n";
-const std::string kEchoCalculation =
-    "\tsection : CALCULATION_PARAMETERS ---------------------\n"
-    "\t\tSearchRadius: 5000.000000\n"
-    "\t\tMaxExtrapolationDistance : 10.000000, 20.000000\n"
-    "\t\tAnalysis : objective\n";
-const std::string kEchoObjective =
-    "\tsection : OBJECTIVE_ANALYSIS_PARAMETERS --------------\n"
-    "\t\tZeroCrossingDistance: 20000.000000\n"
-    "\t\tDecayDistance : 8000.000000\n"
-    "\t\tErrorVariance : 0.100000\n"
-    "\t\tMinData : -2.000000\n"
-    "\t\tMaxData : 30.000000\n"
-    "\t\tFilterOperations : 2\n"
-    "\t\tCorrelationSampleSize : 20\n"
-    "\t\tFilterType : 12 pts filter \n";
-std::string echoOutput(const std::string& dir) {
-  return "\tsection : OUTPUT_DATA --------------------------------\n"
-         "\t\tFileName : " + dir + "/result.nc\n"
-         "\t\tTitle : Temperature, western Baltic\n"
-         "\t\tItemType : 2\n" + kRule;
+// The first `parts` parts of the echo of kComplete read from directory dir:
+// the target line, then the five sections in order, the last with the closing rule.
+std::string echo(const std::string& dir, int parts) {
+  const std::string rule(70, '=');
+  const std::string all[] = {
+      rule + "\nTARGET: Q4_DIGITIZING_OF_DATA\n",
+      "\tsection: INPUT_FILES ---------------------------------\n"
+      "\t\tFileName : " + dir + "/bathymetry.nc\n"
+      "\t\tDataFileName : " + dir + "/observations.txt\n"
+      "\t\tProjection: UTM-32\n",
+      "\tsection : DESCRIPTION_OF_GRID ------------------------\n"
+      "\t\tZRange : 0, 19\n"
+      "\t\tSpacing : 2.500000\n",
+      "\tsection : CALCULATION_PARAMETERS ---------------------\n"
+      "\t\tSearchRadius: 5000.000000\n"
+      "\t\tMaxExtrapolationDistance : 10.000000, 20.000000\n"
+      "\t\tAnalysis : objective\n",
+      "\tsection : OBJECTIVE_ANALYSIS_PARAMETERS --------------\n"
+      "\t\tZeroCrossingDistance: 20000.000000\n"
+      "\t\tDecayDistance : 8000.000000\n"
+      "\t\tErrorVariance : 0.100000\n"
+      "\t\tMinData : -2.000000\n"
+      "\t\tMaxData : 30.000000\n"
+      "\t\tFilterOperations : 2\n"
+      "\t\tCorrelationSampleSize : 20\n"
+      "\t\tFilterType : 12 pts filter \n",
+      "\tsection : OUTPUT_DATA --------------------------------\n"
+      "\t\tFileName : " + dir + "/result.nc\n"
+      "\t\tTitle : Temperature, western Baltic\n"
+      "\t\tItemType : 2\n" + rule + "\n"};
+  std::string text;
+  for (int i = 0; i < parts; ++i) text += all[i];
+  return text;
 }
 
 // text with the first occurrence of from replaced by to.
 std::string with(std::string text, const std::string& from, const std::string& to) {
   const std::size_t at = text.find(from);
   EXPECT_NE(at, std::string::npos) << from;
-  if (at != std::string::npos) text.replace(at, from.size(), to);
-  return text;
+  return at == std::string::npos ? text : text.replace(at, from.size(), to);
 }
 
-// text without the block [name] ... EndSect  // name.
-std::string without(const std::string& text, const std::string& name) {
-  const std::size_t from = text.find("   [" + name + "]\n");
-  const std::string end = "EndSect  // " + name + "\n";
-  const std::size_t to = text.find(end);
-  EXPECT_TRUE(from != std::string::npos && to != std::string::npos) << name;
-  if (from == std::string::npos || to == std::string::npos) return text;
-  return text.substr(0, from) + text.substr(to + end.size());
+// "run.pfs:LINE: " for the first line of text that contains needle.
+std::string where(const std::string& text, const std::string& needle) {
+  const std::size_t at = std::min(text.find(needle), text.size());
+  EXPECT_LT(at, text.size()) << needle;
+  const auto line = 1 + std::count(text.begin(), text.begin() + static_cast<long>(at), '\n');
+  return "run.pfs:" + std::to_string(line) + ": ";
 }
 
-// The 1-based line of the first line of text that contains needle.
-int lineOf(const std::string& text, const std::string& needle) {
-  const std::size_t at = text.find(needle);
-  EXPECT_NE(at, std::string::npos) << needle;
-  return 1 + static_cast<int>(std::count(text.begin(), text.begin() + static_cast<long>(at), '\n'));
-}
-
-// Runs readParameterFile with the log going to a temporary file.
+// Runs readParameterFile with the log going to a buffer.
 class ParameterReaderTest : public ::testing::Test {
  protected:
-  int read(const std::string& text, const std::string& name = "run.pfs") {
-    return readPath(dir_.write(name, text));
-  }
+  int read(const std::string& text) { return readPath(dir_.write("run.pfs", text)); }
 
   int readPath(const std::string& path) {
-    std::FILE* stream = std::tmpfile();
-    EXPECT_NE(stream, nullptr);
+    char* buffer = nullptr;
+    std::size_t size = 0;
+    std::FILE* stream = open_memstream(&buffer, &size);
     logSetStream(stream);
     const int result = readParameterFile(path.c_str());
     logSetStream(nullptr);
-    log_.clear();
-    std::rewind(stream);
-    char buffer[4096];
-    std::size_t n;
-    while ((n = std::fread(buffer, 1, sizeof buffer, stream)) > 0) log_.append(buffer, n);
     std::fclose(stream);
+    log_.assign(buffer, size);
+    std::free(buffer);
     return result;
   }
 
-  TempDir dir_;
+  test::TempDir dir_;
   std::string log_;
 };
 
 TEST_F(ParameterReaderTest, CompleteFileIsReadAndEchoedExactly) {
   ASSERT_EQ(read(kComplete), 1) << log_;
   const std::string& d = dir_.path();
-  EXPECT_EQ(log_, echoTarget() + echoInputFiles(d) + kEchoGrid + kEchoCalculation +
-                      kEchoObjective + echoOutput(d));
-
-  // Every section header line is 56 characters with its tab and newline.
-  int headers = 0;
-  for (std::size_t at = log_.find("\tsection"); at != std::string::npos;
-       at = log_.find("\tsection", at + 1)) {
-    EXPECT_EQ(log_.find('\n', at) + 1 - at, 56u) << log_.substr(at, 60);
-    ++headers;
-  }
-  EXPECT_EQ(headers, 5);
+  EXPECT_EQ(log_, echo(d, 6));
 
   const RunParameters& p = runParameters;
   EXPECT_EQ(std::string(p.inputFiles.DataFileName), d + "/observations.txt");
   EXPECT_EQ(std::string(p.inputFiles.FileName), d + "/bathymetry.nc");
   EXPECT_STREQ(p.inputFiles.Projection, "UTM-32");
-  EXPECT_EQ(p.gridDescription.ZRange[0], 0);
-  EXPECT_EQ(p.gridDescription.ZRange[1], 19);
-  EXPECT_EQ(p.gridDescription.Spacing, 2.5f);
-  EXPECT_EQ(p.calculationParameters.SearchRadius, 5000.0f);
-  EXPECT_EQ(p.calculationParameters.MaxExtrapolationDistance[0], 10.0f);
-  EXPECT_EQ(p.calculationParameters.MaxExtrapolationDistance[1], 20.0f);
-  EXPECT_EQ(p.calculationParameters.Analysis, 0);
+  const GridDescription& g = p.gridDescription;
+  EXPECT_EQ(std::tuple(g.ZRange[0], g.ZRange[1], g.Spacing), std::tuple(0, 19, 2.5f));
+  const CalculationParameters& c = p.calculationParameters;
+  EXPECT_EQ(std::tuple(c.SearchRadius, c.MaxExtrapolationDistance[0],
+                       c.MaxExtrapolationDistance[1], c.Analysis),
+            std::tuple(5000.0f, 10.0f, 20.0f, 0));
   const ObjectiveAnalysisParameters& oa = p.objectiveAnalysisParameters;
-  EXPECT_EQ(oa.ZeroCrossingDistance, 20000.0f);
-  EXPECT_EQ(oa.DecayDistance, 8000.0f);
-  EXPECT_EQ(oa.ErrorVariance, 0.1f);
-  EXPECT_EQ(oa.MinData, -2.0f);
-  EXPECT_EQ(oa.MaxData, 30.0f);
-  EXPECT_EQ(oa.FilterOperations, 2);
-  EXPECT_EQ(oa.CorrelationSampleSize, 20);
-  EXPECT_EQ(oa.FilterType, 1);
+  EXPECT_EQ(std::tuple(oa.ZeroCrossingDistance, oa.DecayDistance, oa.ErrorVariance, oa.MinData,
+                       oa.MaxData),
+            std::tuple(20000.0f, 8000.0f, 0.1f, -2.0f, 30.0f));
+  EXPECT_EQ(std::tuple(oa.FilterOperations, oa.CorrelationSampleSize, oa.FilterType),
+            std::tuple(2, 20, 1));
   EXPECT_EQ(std::string(p.outputData.FileName), d + "/result.nc");
   EXPECT_STREQ(p.outputData.Title, "Temperature, western Baltic");
   EXPECT_EQ(p.outputData.ItemType, 2);
 }
 
-// Without a log stream nothing is echoed, but the values are read all the same.
-TEST_F(ParameterReaderTest, ReadsWithoutALogStream) {
-  logSetStream(nullptr);
-  const std::string path = dir_.write("quiet.pfs", with(kComplete, "ItemType = 2", "ItemType = 7"));
-  ASSERT_EQ(readParameterFile(path.c_str()), 1);
-  EXPECT_EQ(runParameters.outputData.ItemType, 7);
-  EXPECT_EQ(runParameters.objectiveAnalysisParameters.CorrelationSampleSize, 20);
-}
-
+// 'bilinear' and '12 pts filter' in any case, anything else the other choice.
 TEST_F(ParameterReaderTest, AnalysisAndFilterTypeChoices) {
   struct Choice {
+    bool analysis;  // else FilterType
     const char* value;
     int expected;
   };
-  const Choice analyses[] = {{"'bilinear'", 1}, {"'BILINEAR'", 1}, {"'BiLiNeAr'", 1},
-                             {"bilinear", 1},   {"Bilinear", 1},   {"'objective'", 0},
-                             {"''", 0},         {"'bilinear '", 0}, {"'bi linear'", 0},
-                             {"'bilinearx'", 0}, {"shapiro", 0}};
-  for (const Choice& c : analyses) {
+  const Choice choices[] = {
+      {true, "'bilinear'", 1},      {true, "'BiLiNeAr'", 1},       {true, "Bilinear", 1},
+      {true, "'objective'", 0},     {true, "'bilinear '", 0},      {true, "'bilinearx'", 0},
+      {true, "''", 0},              {false, "'12 pts filter'", 1}, {false, "'12 PTS FILTER'", 1},
+      {false, "'shapiro'", 0},      {false, "'12pts filter'", 0},  {false, "'12 pts  filter'", 0}};
+  const char* echoed[2][2] = {{"\t\tFilterType : shapiro \n", "\t\tFilterType : 12 pts filter \n"},
+                              {"\t\tAnalysis : objective\n", "\t\tAnalysis : bilinear\n"}};
+  for (const Choice& c : choices) {
     SCOPED_TRACE(c.value);
-    ASSERT_EQ(read(with(kComplete, "Analysis = 'objective'",
-                        std::string("Analysis = ") + c.value)),
-              1)
-        << log_;
-    EXPECT_EQ(runParameters.calculationParameters.Analysis, c.expected);
-    EXPECT_NE(log_.find(c.expected ? "\t\tAnalysis : bilinear\n" : "\t\tAnalysis : objective\n"),
-              std::string::npos);
-  }
-  const Choice filters[] = {{"'12 pts filter'", 1}, {"'12 PTS FILTER'", 1}, {"'12 Pts Filter'", 1},
-                            {"'shapiro'", 0},       {"shapiro", 0},         {"'12pts filter'", 0},
-                            {"''", 0},              {"'12 pts  filter'", 0}};
-  for (const Choice& c : filters) {
-    SCOPED_TRACE(c.value);
-    ASSERT_EQ(read(with(kComplete, "FilterType = '12 pts filter'",
-                        std::string("FilterType = ") + c.value)),
-              1)
-        << log_;
-    EXPECT_EQ(runParameters.objectiveAnalysisParameters.FilterType, c.expected);
-    EXPECT_NE(log_.find(c.expected ? "\t\tFilterType : 12 pts filter \n"
-                                   : "\t\tFilterType : shapiro \n"),
-              std::string::npos);
+    const std::string from = c.analysis ? "Analysis = 'objective'" : "FilterType = '12 pts filter'";
+    ASSERT_EQ(read(with(kComplete, from, from.substr(0, from.find('=') + 2) + c.value)), 1) << log_;
+    EXPECT_EQ(c.analysis ? runParameters.calculationParameters.Analysis
+                         : runParameters.objectiveAnalysisParameters.FilterType,
+              c.expected);
+    EXPECT_NE(log_.find(echoed[c.analysis][c.expected]), std::string::npos) << log_;
   }
 }
 
-// A missing section stops the reading after the echo of the sections before
-// it, with the cause on one line after them.
-TEST_F(ParameterReaderTest, MissingSectionsKeepTheEchoBeforeThem) {
-  const std::string& d = dir_.path();
-  const std::string noOutput = without(kComplete, "OUTPUT_DATA");
-  EXPECT_EQ(read(noOutput), 0);
-  EXPECT_EQ(log_, echoTarget() + echoInputFiles(d) + kEchoGrid + kEchoCalculation +
-                      kEchoObjective + "run.pfs:" + std::to_string(lineOf(noOutput, "EndSect  // Q4")) +
-                      ": section [OUTPUT_DATA] not found in [Q4_DIGITIZING_OF_DATA]\n");
-  // What was read before stays.
-  EXPECT_EQ(runParameters.objectiveAnalysisParameters.CorrelationSampleSize, 20);
-  EXPECT_EQ(runParameters.gridDescription.ZRange[1], 19);
-
-  // A bilinear run needs the objective-analysis section all the same.
-  const std::string bilinear =
-      without(with(kComplete, "Analysis = 'objective'", "Analysis = 'bilinear'"),
-              "OBJECTIVE_ANALYSIS_PARAMETERS");
-  EXPECT_EQ(read(bilinear), 0);
-  EXPECT_EQ(log_, echoTarget() + echoInputFiles(d) + kEchoGrid +
-                      with(kEchoCalculation, "objective", "bilinear") + "run.pfs:" +
-                      std::to_string(lineOf(bilinear, "EndSect  // Q4")) +
-                      ": section [OBJECTIVE_ANALYSIS_PARAMETERS] not found in "
-                      "[Q4_DIGITIZING_OF_DATA]\n");
-
-  const std::string noInput = without(kComplete, "INPUT_FILES");
-  EXPECT_EQ(read(noInput), 0);
-  EXPECT_EQ(log_, echoTarget() + "run.pfs:" + std::to_string(lineOf(noInput, "EndSect  // Q4")) +
-                      ": section [INPUT_FILES] not found in [Q4_DIGITIZING_OF_DATA]\n");
-
-  // Section names are case-sensitive.
-  EXPECT_EQ(read(with(kComplete, "[DESCRIPTION_OF_GRID]", "[Description_Of_Grid]")), 0);
-  EXPECT_NE(log_.find("section [DESCRIPTION_OF_GRID] not found"), std::string::npos);
-}
-
-TEST_F(ParameterReaderTest, AnotherTargetFailsBeforeAnyEcho) {
-  const std::string other = with(kComplete, "[Q4_DIGITIZING_OF_DATA]", "[Q4_DIGITIZING]");
-  EXPECT_EQ(read(other), 0);
-  EXPECT_EQ(log_, "run.pfs:" + std::to_string(lineOf(other, "EndSect  // Q4")) +
-                      ": target [Q4_DIGITIZING_OF_DATA] not found\n");
-  EXPECT_EQ(read(""), 0);
-  EXPECT_EQ(log_, "run.pfs:1: target [Q4_DIGITIZING_OF_DATA] not found\n");
-}
-
-TEST_F(ParameterReaderTest, UnreadableAndMalformedFiles) {
-  EXPECT_EQ(readPath(dir_.file("nothere.pfs")), 0);
-  EXPECT_EQ(log_, "Can't open nothere.pfs\n");
-
-  const std::string broken = with(kComplete, "Spacing = 2.5", "Spacing = 2.5 m");
-  EXPECT_EQ(read(broken, "broken.pfs"), 0);
-  EXPECT_EQ(log_, "broken.pfs:" + std::to_string(lineOf(broken, "Spacing")) +
-                      ": expected ',' between the values of keyword Spacing, found 'm'\n");
-
-  const std::string unclosed = kComplete.substr(0, kComplete.rfind("EndSect"));
-  EXPECT_EQ(read(unclosed), 0);
-  EXPECT_EQ(log_, "run.pfs:2: block Q4_DIGITIZING_OF_DATA is not closed (EndSect missing)\n");
-}
-
-// A missing keyword or a value of the wrong kind stops the reading; the values
-// of the section read before it are kept, its echo is not written.
-TEST_F(ParameterReaderTest, KeywordFailuresNameTheCause) {
+// A failure stops the reading with the cause on one line, after the echo of
+// the sections read completely before it (none for a file that is not read).
+TEST_F(ParameterReaderTest, FailuresKeepTheEchoBeforeThemAndNameTheCause) {
   struct Case {
-    std::string from, to;   // the change to kComplete
-    std::string needle;     // the line the cause names
+    std::string from, to;  // the change to kComplete
+    std::string needle;    // the line the cause names
     std::string reason;
-    int sectionsEchoed;     // complete sections before the failure
+    int parts;  // echo parts before the cause
   };
+  const std::string end = "EndSect  // Q4", target = "[Q4_DIGITIZING_OF_DATA]";
   const Case cases[] = {
+      {target, "[Q4_DIGITIZING]", end, "target [Q4_DIGITIZING_OF_DATA] not found", 0},
+      {"Spacing = 2.5", "Spacing = 2.5 m", "Spacing",
+       "expected ',' between the values of keyword Spacing, found 'm'", 0},
+      // Missing sections; section names are case-sensitive.
+      {"[INPUT_FILES]", "[INPUT]", end, "section [INPUT_FILES] not found in " + target, 1},
+      {"[DESCRIPTION_OF_GRID]", "[Description_Of_Grid]", end,
+       "section [DESCRIPTION_OF_GRID] not found in " + target, 2},
+      {"[OUTPUT_DATA]", "[OUTPUT]", end, "section [OUTPUT_DATA] not found in " + target, 5},
+      // Missing keywords and values of the wrong kind or size.
       {"      Projection = 'UTM-32'\n", "", "EndSect  // INPUT_FILES",
-       "keyword Projection not found in section [INPUT_FILES]", 0},
+       "keyword Projection not found in section [INPUT_FILES]", 1},
       {"Projection = 'UTM-32'", "Projection = 32", "Projection",
-       "keyword Projection: parameter 1 (the number 32) is not a text", 0},
+       "keyword Projection: parameter 1 (the number 32) is not a text", 1},
       {"DataFileName = |./observations.txt|", "DataFileName = 'observations.txt'", "DataFileName",
        "keyword DataFileName: parameter 1 (the text 'observations.txt') is not a file name "
-       "between | |", 0},
-      {"ZRange = 0, 19", "ZRange = 0", "ZRange", "keyword ZRange has 1 value, 2 expected", 1},
+       "between | |", 1},
+      {"ZRange = 0, 19", "ZRange = 0", "ZRange", "keyword ZRange has 1 value, 2 expected", 2},
       {"ZRange = 0, 19", "ZRange = 0, 19.5", "ZRange",
-       "keyword ZRange: parameter 2 (the number 19.5) is not an integer", 1},
+       "keyword ZRange: parameter 2 (the number 19.5) is not an integer", 2},
       {"Spacing = 2.5", "Spacing = 'wide'", "Spacing",
-       "keyword Spacing: parameter 1 (the text 'wide') is not a number", 1},
+       "keyword Spacing: parameter 1 (the text 'wide') is not a number", 2},
       {"MaxExtrapolationDistance = 10, 20", "MaxExtrapolationDistance = 10, 20, 30",
-       "MaxExtrapolationDistance", "keyword MaxExtrapolationDistance has 3 values, 2 expected", 2},
+       "MaxExtrapolationDistance", "keyword MaxExtrapolationDistance has 3 values, 2 expected", 3},
       {"Analysis = 'objective'", "Analysis = 1", "Analysis",
-       "keyword Analysis: parameter 1 (the number 1) is not a text", 2},
+       "keyword Analysis: parameter 1 (the number 1) is not a text", 3},
       {"      DecayDistance = 8000\n", "", "EndSect  // OBJECTIVE",
-       "keyword DecayDistance not found in section [OBJECTIVE_ANALYSIS_PARAMETERS]", 3},
+       "keyword DecayDistance not found in section [OBJECTIVE_ANALYSIS_PARAMETERS]", 4},
       {"FilterOperations = 2", "FilterOperations = 2.5", "FilterOperations",
-       "keyword FilterOperations: parameter 1 (the number 2.5) is not an integer", 3},
-      {"CorrelationSampleSize = 20", "CorrelationSampleSize = 1e40", "CorrelationSampleSize",
-       "keyword CorrelationSampleSize: parameter 1 (the number 1e40) is not an integer", 3},
+       "keyword FilterOperations: parameter 1 (the number 2.5) is not an integer", 4},
       {"ErrorVariance = 0.1", "ErrorVariance = 1e39", "ErrorVariance",
        "keyword ErrorVariance: parameter 1 (the number 1e39) is not a number within the float "
-       "range", 3},
+       "range", 4},
       {"Title = 'Temperature, western Baltic'", "Title = |title.txt|", "Title",
-       "keyword Title: parameter 1 (the file name |" + dir_.path() +
-           "/title.txt|) is not a text", 4},
+       "keyword Title: parameter 1 (the file name |" + dir_.path() + "/title.txt|) is not a text",
+       5},
       {"ItemType = 2", "ItemType = 4294967298", "ItemType",
        "keyword ItemType: parameter 1 (the number 4294967298) is not an integer within 32 bits",
-       4},
+       5},
   };
-  const std::string& d = dir_.path();
-  const std::string echoes[] = {echoInputFiles(d), kEchoGrid, kEchoCalculation, kEchoObjective};
   for (const Case& c : cases) {
-    SCOPED_TRACE(c.to);
+    SCOPED_TRACE(c.from + " -> " + c.to);
     const std::string text = with(kComplete, c.from, c.to);
     EXPECT_EQ(read(text), 0);
-    std::string expected = echoTarget();
-    for (int s = 0; s < c.sectionsEchoed; ++s) expected += echoes[s];
-    expected += "run.pfs:" + std::to_string(lineOf(text, c.needle)) + ": " + c.reason + "\n";
-    EXPECT_EQ(log_, expected);
+    EXPECT_EQ(log_, echo(dir_.path(), c.parts) + where(text, c.needle) + c.reason + "\n");
   }
+
+  // A bilinear run needs the objective-analysis section all the same.
+  const std::string bilinear = with(with(kComplete, "'objective'", "'bilinear'"),
+                                    "[OBJECTIVE_ANALYSIS_PARAMETERS]", "[OBJECTIVE]");
+  EXPECT_EQ(read(bilinear), 0);
+  EXPECT_EQ(log_, with(echo(dir_.path(), 4), "objective", "bilinear") + where(bilinear, end) +
+                      "section [OBJECTIVE_ANALYSIS_PARAMETERS] not found in " + target + "\n");
+
+  EXPECT_EQ(read(""), 0);
+  EXPECT_EQ(log_, "run.pfs:1: target " + target + " not found\n");
+  EXPECT_EQ(readPath(dir_.file("nothere.pfs")), 0);
+  EXPECT_EQ(log_, "Can't open nothere.pfs\n");
 
   // Values read before the failing keyword are stored, later ones are not.
   ASSERT_EQ(read(with(kComplete, "FilterOperations = 2", "FilterOperations = x")), 0);
   const ObjectiveAnalysisParameters& oa = runParameters.objectiveAnalysisParameters;
-  EXPECT_EQ(oa.MaxData, 30.0f);
-  EXPECT_EQ(oa.FilterOperations, 0);
-  EXPECT_EQ(oa.CorrelationSampleSize, 0);
+  EXPECT_EQ(std::tuple(runParameters.gridDescription.ZRange[1], oa.MaxData, oa.FilterOperations,
+                       oa.CorrelationSampleSize),
+            std::tuple(19, 30.0f, 0, 0));
 }
 
-TEST_F(ParameterReaderTest, OnlyTheFirstOccurrenceCountsAndExtrasAreIgnored) {
+// Without a log stream nothing is echoed, but the values are read all the same.
+TEST_F(ParameterReaderTest, OnlyTheFirstOccurrenceCountsExtrasAreIgnoredNoLogIsNeeded) {
   const std::string text =
       with(with(kComplete, "      Spacing = 2.5\n",
-                "      Spacing = 2.5, 99\n      Spacing = 7\n      Unknown = 'x'\n"),
+                "      Spacing = 3.5, 99\n      Spacing = 7\n      Unknown = 'x'\n"),
            "   [OUTPUT_DATA]\n", "   [EXTRA]\n      A = 1\n   EndSect\n   [OUTPUT_DATA]\n");
-  ASSERT_EQ(read(text), 1) << log_;
-  EXPECT_EQ(runParameters.gridDescription.Spacing, 2.5f);
+  logSetStream(nullptr);
+  ASSERT_EQ(readParameterFile(dir_.write("quiet.pfs", text).c_str()), 1);
+  EXPECT_EQ(runParameters.gridDescription.Spacing, 3.5f);
 }
 
 TEST_F(ParameterReaderTest, TextLengthLimits) {
-  const std::string name259 = "/" + std::string(258, 'a');
+  const std::string name259 = "/" + std::string(258, 'a'), projection1023(1023, 'p');
   ASSERT_EQ(read(with(kComplete, "|./bathymetry.nc|", "|" + name259 + "|")), 1) << log_;
   EXPECT_EQ(std::string(runParameters.inputFiles.FileName), name259);
+  ASSERT_EQ(read(with(kComplete, "'UTM-32'", "'" + projection1023 + "'")), 1) << log_;
+  EXPECT_EQ(std::string(runParameters.inputFiles.Projection), projection1023);
 
   // A longer name is refused rather than cut to the name of another file.
   const std::string text = with(kComplete, "|./result.nc|", "|" + name259 + "b|");
   EXPECT_EQ(read(text), 0);
-  EXPECT_NE(log_.find("run.pfs:" + std::to_string(lineOf(text, "FileName = |/aaa")) +
-                      ": keyword FileName: the value has 260 characters, at most 259 are "
-                      "allowed\n"),
+  EXPECT_NE(log_.find(where(text, "FileName = |/aaa") +
+                      "keyword FileName: the value has 260 characters, at most 259 are allowed\n"),
             std::string::npos)
       << log_;
-
-  const std::string projection1023(1023, 'p');
-  ASSERT_EQ(read(with(kComplete, "'UTM-32'", "'" + projection1023 + "'")), 1) << log_;
-  EXPECT_EQ(std::string(runParameters.inputFiles.Projection), projection1023);
   EXPECT_EQ(read(with(kComplete, "'UTM-32'", "'" + projection1023 + "p'")), 0);
   EXPECT_NE(log_.find("keyword Projection: the value has 1024 characters, at most 1023"),
             std::string::npos);
@@ -375,11 +283,11 @@ TEST_F(ParameterReaderTest, TextLengthLimits) {
   // The title is only shown: a long one is cut, never inside a UTF-8 character.
   std::string title;
   for (int i = 0; i < 150; ++i) title += "\xC3\xA9";  // 300 bytes
-  ASSERT_EQ(read(with(kComplete, "'Temperature, western Baltic'", "'" + title + "'")), 1) << log_;
-  EXPECT_EQ(std::string(runParameters.outputData.Title), title.substr(0, 258));
-  ASSERT_EQ(read(with(kComplete, "'Temperature, western Baltic'", "'" + std::string(400, 't') + "'")),
-            1);
-  EXPECT_EQ(std::string(runParameters.outputData.Title), std::string(259, 't'));
+  for (const auto& [t, cut] : {std::pair(title, title.substr(0, 258)),
+                                std::pair(std::string(400, 't'), std::string(259, 't'))}) {
+    ASSERT_EQ(read(with(kComplete, "'Temperature, western Baltic'", "'" + t + "'")), 1) << log_;
+    EXPECT_EQ(std::string(runParameters.outputData.Title), cut);
+  }
 }
 
 }  // namespace
