@@ -1,120 +1,81 @@
 #include "child_process.h"
 
+#include <errno.h>
+#include <fcntl.h>
 #include <poll.h>
 #include <signal.h>
-#include <sys/ioctl.h>
 #include <sys/wait.h>
-#include <time.h>
 #include <unistd.h>
 
-#include <cerrno>
-#include <cstdio>
+#include <chrono>
 #include <cstdlib>
 #include <fstream>
-#include <sstream>
+#include <iterator>
 
 namespace karnet::testing {
-namespace {
-
-long long nowMs() {
-  timespec now{};
-  clock_gettime(CLOCK_MONOTONIC, &now);
-  return now.tv_sec * 1000LL + now.tv_nsec / 1000000;
-}
-
-// Reads what is available now; false at end of input.
-bool readAvailable(int fd, std::string& output, int waitMs) {
-  pollfd input{fd, POLLIN, 0};
-  if (poll(&input, 1, waitMs) <= 0) return true;
-  char buffer[4096];
-  const ssize_t count = read(fd, buffer, sizeof buffer);
-  if (count > 0) {
-    output.append(buffer, static_cast<std::size_t>(count));
-    return true;
-  }
-  return count < 0 && errno == EINTR;
-}
-
-}  // namespace
 
 ChildOutcome runChild(const std::function<void()>& body, const ChildSetup& setup) {
-  int pipeFds[2] = {-1, -1};
-  int outputFd = setup.outputFd;
-  if (setup.stderrFd < 0) {
-    if (pipe(pipeFds) != 0) return {};
-    outputFd = pipeFds[0];
-  }
+  int fds[2] = {-1, -1};  // the child's standard error and where the test reads it
+  if (setup.terminal < 0 && pipe(fds) != 0) return {};
   std::fflush(nullptr);
   const pid_t child = fork();
   if (child == 0) {
-    if (setup.controllingTerminal) {
-      setsid();
-      ioctl(setup.stdinFd >= 0 ? setup.stdinFd : setup.stderrFd, TIOCSCTTY, 0);
+    if (setup.terminal >= 0) {
+      setsid();  // opened by a session leader, the terminal becomes its controlling one
+      dup2(fds[1] = open(ptsname(setup.terminal), O_RDWR), STDIN_FILENO);
     }
     if (setup.stdinFd >= 0) dup2(setup.stdinFd, STDIN_FILENO);
-    dup2(setup.stderrFd >= 0 ? setup.stderrFd : pipeFds[1], STDERR_FILENO);
-    if (pipeFds[0] >= 0) {
-      close(pipeFds[0]);
-      close(pipeFds[1]);
-    }
+    dup2(fds[1], STDERR_FILENO);
     body();
     std::fflush(nullptr);
     _exit(0);
   }
-  if (pipeFds[1] >= 0) close(pipeFds[1]);
-
+  if (setup.terminal < 0) close(fds[1]);
+  pollfd output{setup.terminal < 0 ? fds[0] : setup.terminal, POLLIN, 0};
+  const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(15);
   ChildOutcome outcome;
-  const long long deadline = nowMs() + setup.timeoutMs;
   int status = 0;
-  bool ended = false;
-  bool open = outputFd >= 0;
-  while (!ended) {
-    const std::size_t before = outcome.output.size();
-    if (open) {
-      open = readAvailable(outputFd, outcome.output, 20);
-    } else {
-      usleep(20000);
-    }
-    if (outcome.output.size() != before && setup.onOutput) setup.onOutput(child, outcome.output);
+  for (bool ended = false; !ended;) {
     ended = waitpid(child, &status, WNOHANG) == child;
-    if (!ended && nowMs() > deadline) {
-      outcome.timedOut = true;
+    if (!ended && std::chrono::steady_clock::now() > deadline) {
       kill(child, SIGKILL);
-      waitpid(child, &status, 0);
-      ended = true;
+      ended = waitpid(child, &status, 0) == child;
     }
+    // All that has arrived; once the child has ended, all it wrote.
+    char buffer[4096];
+    ssize_t count = -1;
+    while (poll(&output, 1, ended ? 0 : 20) > 0 && (count = read(output.fd, buffer, 4096)) > 0) {
+      outcome.output.append(buffer, static_cast<std::size_t>(count));
+      if (setup.onOutput) setup.onOutput(child, outcome.output);
+    }
+    if (count == 0 && !ended) usleep(20000);  // at the end of a pipe, before the child is gone
   }
-  // What the child wrote just before it ended.
-  while (open && outputFd >= 0) {
-    const std::size_t before = outcome.output.size();
-    open = readAvailable(outputFd, outcome.output, 0);
-    if (outcome.output.size() == before) break;
-  }
-  if (pipeFds[0] >= 0) close(pipeFds[0]);
-
-  if (WIFEXITED(status)) {
-    outcome.exited = true;
-    outcome.exitCode = WEXITSTATUS(status);
-  } else if (WIFSIGNALED(status)) {
-    outcome.signal = WTERMSIG(status);
-  }
+  if (setup.terminal < 0) close(fds[0]);
+  outcome.exitCode = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+  outcome.signal = WIFSIGNALED(status) ? WTERMSIG(status) : 0;
   return outcome;
 }
 
 TempFile::TempFile() {
   char name[] = "/tmp/karnet_testXXXXXX";
-  const int fd = mkstemp(name);
-  if (fd >= 0) close(fd);
-  path_ = name;
+  close(mkstemp(name));
+  path = name;
 }
 
-TempFile::~TempFile() { std::remove(path_.c_str()); }
-
 std::string TempFile::contents() const {
-  std::ifstream in(path_);
-  std::stringstream content;
-  content << in.rdbuf();
-  return content.str();
+  std::ifstream in(path);
+  return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
+}
+
+std::string reportBlock(const char* completion) {
+  return std::string("\n--------------- RUN TIME INFORMATION --------------\n--\n") +
+         "-- CPU time        : 0 [s]\n--\n-- Completion code : " + completion +
+         "\n--\n---------------------------------------------------\n";
+}
+
+std::string programName() {
+  const std::string name = program_invocation_short_name;
+  return name.substr(0, name.rfind('.'));
 }
 
 }  // namespace karnet::testing

@@ -3,51 +3,46 @@
 #ifndef KARNET_TESTS_CONTROL_CHILD_PROCESS_H_
 #define KARNET_TESTS_CONTROL_CHILD_PROCESS_H_
 
+#include <sys/types.h>
+
+#include <cstdio>
 #include <functional>
 #include <string>
 
 namespace karnet::testing {
 
 struct ChildOutcome {
-  bool exited = false;   // ended through exit with exitCode
-  int exitCode = -1;
-  int signal = 0;        // the signal that ended it, when it did not exit
-  bool timedOut = false;
-  std::string output;    // what it wrote on its standard error stream
+  int exitCode = -1;   // -1: it did not end through exit
+  int signal = 0;      // the signal that ended it, if one did
+  std::string output;  // what it wrote on its standard error stream
 };
 
 struct ChildSetup {
-  // The child's standard input; -1 keeps the test's own.
-  int stdinFd = -1;
-  // The child's standard error (a terminal, for instance) and the descriptor
-  // the test reads it back from; both -1: a pipe.
-  int stderrFd = -1;
-  int outputFd = -1;
-  // Makes the child a session leader with stdinFd or stderrFd as its
-  // controlling terminal, so that it runs in the terminal's foreground.
-  bool controllingTerminal = false;
+  int stdinFd = -1;  // the child's standard input; -1 keeps the test's own
+  // The master side of a pseudo terminal that becomes the child's controlling
+  // terminal, standard input and standard error; -1: standard error is a pipe.
+  int terminal = -1;
   // Called in the test's process whenever more output has arrived.
-  std::function<void(pid_t child, const std::string& outputSoFar)> onOutput;
-  int timeoutMs = 15000;
+  std::function<void(pid_t child, const std::string& outputSoFar)> onOutput = nullptr;
 };
 
 // Runs body in a forked child; a body that returns ends the child with code 0.
+// A child still running after 15 seconds is killed.
 ChildOutcome runChild(const std::function<void()>& body, const ChildSetup& setup = {});
 
 // A file under /tmp that a child writes (a log, say) and the test reads back.
-class TempFile {
- public:
+struct TempFile {
   TempFile();
-  ~TempFile();
-  TempFile(const TempFile&) = delete;
-  TempFile& operator=(const TempFile&) = delete;
-
-  const std::string& path() const { return path_; }
+  ~TempFile() { std::remove(path.c_str()); }
   std::string contents() const;
-
- private:
-  std::string path_;
+  std::string path;
 };
+
+// The run-time report block, for a run that took no measurable CPU time.
+std::string reportBlock(const char* completion);
+
+// The program's base name as the C library saw it at start, without extension.
+std::string programName();
 
 }  // namespace karnet::testing
 

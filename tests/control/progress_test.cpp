@@ -1,138 +1,244 @@
-// Progress arithmetic (percentage, speed, time left) and the cancel request.
+// Progress arithmetic (percentage, speed, time left), and the host that shows it
+// on a terminal or without one: what it shows, how the user cancels, and that
+// the terminal is always given back as it was.
 #include "control/progress.h"
 
 #include <gtest/gtest.h>
+#include <pty.h>
 #include <signal.h>
+#include <sys/ioctl.h>
+#include <termios.h>
+#include <unistd.h>
 
+#include <algorithm>
+#include <cstring>
 #include <string>
+#include <tuple>
 
 #include "child_process.h"
 #include "control/host.h"
-#include "control/log.h"
 
 namespace karnet {
 namespace {
 
-using karnet::testing::ChildOutcome;
-using karnet::testing::runChild;
-using karnet::testing::TempFile;
+using namespace karnet::testing;
 
-std::int64_t fakeNow = 0;
-std::int64_t fakeClock() { return fakeNow; }
+std::int64_t fakeNow = 1'700'000'000;
 
-class ProgressTest : public ::testing::Test {
- protected:
-  void SetUp() override {
-    fakeNow = 1'700'000'000;
-    progressSetClock(fakeClock);
-  }
-  void TearDown() override { progressSetClock(nullptr); }
-
-  static void expectShown(int percent, int timeLeft, int speed) {
-    const HostDisplayState shown = apvDisplayState();
-    EXPECT_EQ(shown.percent, percent);
-    EXPECT_EQ(shown.timeLeft, timeLeft);
-    EXPECT_EQ(shown.speed, speed);
-  }
-};
-
-TEST_F(ProgressTest, ReportsPercentSpeedAndTimeLeftOfTheCurrentCount) {
-  progressStart(200);
-  fakeNow += 10;
-  progressReport(50);
-  expectShown(25, 30, 5);  // 50 units in 10 s: 5/s, 150 left
-
-  fakeNow += 5;
-  progressReport(199);  // 199/200 = 99.5 %, 13.27/s, 0.075 s left: all truncated
-  expectShown(99, 0, 13);
-
-  progressStart(3);  // a new count replaces the old one
-  fakeNow += 2;
-  progressReport(1);
-  expectShown(33, 4, 0);
-}
-
-TEST_F(ProgressTest, GridCountsEveryNodeOfTheLocalGrid) {
-  progressStartGrid(10, 20, 4);  // 10 * (20 * 5 + 1) = 1010 units
-  fakeNow += 1;
-  progressReportGrid(0, 0, 0);
-  expectShown(0, 1009, 1);  // one unit done
-
-  progressReportGrid(3, 5, 2);  // (10 * 2 + 3) * 20 + 5 + 1 = 466 units
-  expectShown(46, 1, 466);
-
-  progressReportGrid(10, 19, 4);  // (10 * 4 + 10) * 20 + 19 + 1 = 1020: past the total
-  expectShown(100, 0, 1020);
-}
-
-TEST_F(ProgressTest, LargeGridsCountBeyondThirtyTwoBits) {
-  progressStartGrid(100000, 100000, 10);  // 1.1e11 units
-  fakeNow += 1000;
-  progressReportGrid(99999, 99999, 10);
-  // (1e5 * 10 + 99999) * 1e5 + 99999 + 1 = 110000000000 of 110000100000 units
-  expectShown(99, 0, 110000000);
-  progressReportGrid(0, 0, 5);  // 5e10 + 1 units
-  EXPECT_EQ(apvDisplayState().percent, 45);
-}
-
-TEST_F(ProgressTest, WithoutElapsedTimeOrTotalNothingDividesByZero) {
-  progressStart(100);
-  progressReport(10);  // no whole second yet
-  expectShown(10, 0, 0);
-
-  progressStart(0);
-  progressReport(0);
-  expectShown(0, 0, 0);
-  fakeNow += 4;
-  progressReport(8);  // units done against a total of nothing
-  expectShown(0, -4, 2);
-
-  progressStart(5);
-  progressReport(0);
-  expectShown(0, 0, 0);
-}
-
-TEST_F(ProgressTest, StatusTextGoesToTheHost) {
+TEST(ProgressTest, ShowsPercentTimeLeftAndSpeedWithoutDividingByZero) {
+  progressSetClock([] { return fakeNow; });
   progressStatus("Scanning bathymetry ...");
   EXPECT_STREQ(apvDisplayState().status, "Scanning bathymetry ...");
   EXPECT_EQ(apvDisplayState().percent, -1);
+  const std::pair<void (*)(), std::tuple<int, int, int>> steps[] = {
+      // 50 units in 10 s: 5/s, 150 left.
+      {[] { progressStart(200); fakeNow += 10; progressReport(50); }, {25, 30, 5}},
+      // 199/200 = 99.5 %, 13.27/s, 0.075 s left: all truncated.
+      {[] { fakeNow += 5; progressReport(199); }, {99, 0, 13}},
+      // A new count replaces the old one.
+      {[] { progressStart(3); fakeNow += 2; progressReport(1); }, {33, 4, 0}},
+      // No whole second yet, no total, units done against a total of nothing.
+      {[] { progressStart(100); progressReport(10); }, {10, 0, 0}},
+      {[] { progressStart(0); progressReport(0); }, {0, 0, 0}},
+      {[] { fakeNow += 4; progressReport(8); }, {0, -4, 2}},
+      // Grids count every node of the local grid: 10 * (20 * 5 + 1) = 1010 units, one done.
+      {[] { progressStartGrid(10, 20, 4); fakeNow += 1; progressReportGrid(0, 0, 0); },
+       {0, 1009, 1}},
+      // (10 * 2 + 3) * 20 + 5 + 1 = 466 units; (10 * 4 + 10) * 20 + 19 + 1 = 1020: past the total.
+      {[] { progressReportGrid(3, 5, 2); }, {46, 1, 466}},
+      {[] { progressReportGrid(10, 19, 4); }, {100, 0, 1020}},
+      // Beyond 32 bits: (1e5 * 10 + 99999) * 1e5 + 99999 + 1 = 1.1e11 of 1.100001e11 units.
+      {[] { progressStartGrid(100000, 100000, 10); fakeNow += 1000;
+            progressReportGrid(99999, 99999, 10); }, {99, 0, 110000000}},
+      {[] { progressReportGrid(0, 0, 5); }, {45, 1200, 50000000}},  // 5e10 + 1 units
+  };
+  for (const auto& [step, expected] : steps) {
+    step();
+    const HostDisplayState state = apvDisplayState();
+    EXPECT_EQ(std::tuple(state.percent, state.timeLeft, state.speed), expected);
+  }
+  EXPECT_EQ(progressCheckCancel(), 0);  // without a host no cancel is ever asked for
+  progressSetClock(nullptr);
 }
 
-TEST_F(ProgressTest, WithoutHostNoCancelIsEverAskedFor) {
-  for (int i = 0; i < 3; ++i) EXPECT_EQ(progressCheckCancel(), 0);
+// One phase of work in twenty steps, as the progress layer reports it.
+void reportSteps() {
+  apvStatus("Interpolating ...");
+  for (int percent = 0; percent <= 100; percent += 5) {
+    apvProgress(percent);
+    apvTimeLeft(100 - percent);
+    apvSpeed(7);
+  }
 }
 
-std::string cancelLogPath;
-
-int cancelledComputation() {
-  logSetStream(std::fopen(cancelLogPath.c_str(), "w"));
-  progressStatus("Interpolating ...");
-  progressStart(100);
-  progressReport(10);
-  std::fputs("no cancel yet\n", stderr);
-  raise(SIGUSR1);
-  progressReport(20);
-  _exit(99);
-}
-
-TEST(ProgressCancelTest, CancelFromTheHostEndsTheRunSuccessfully) {
-  TempFile log;
-  cancelLogPath = log.path();
-  const ChildOutcome outcome = runChild([] {
-    setenv("H84", "APV", 1);
-    apvStart("karnet", cancelledComputation);
-    _exit(98);
+TEST(HostTest, WithoutTerminalPlainModeShowsNothingAndHostModeEveryTenthLine) {
+  ChildOutcome outcome = runChild([] {
+    reportSteps();
+    if (apvCancel() != 0) _exit(3);
+    apvShutdown();
   });
-  EXPECT_TRUE(outcome.exited);
   EXPECT_EQ(outcome.exitCode, 0);
-  const std::size_t asked = outcome.output.find("no cancel yet\n");
-  ASSERT_NE(asked, std::string::npos) << outcome.output;
-  EXPECT_EQ(outcome.output.substr(outcome.output.size() - 20), "\nCancel computation\n")
-      << outcome.output;
-  EXPECT_EQ(log.contents(),
-            "\n--------------- RUN TIME INFORMATION --------------\n--\n"
-            "-- CPU time        : 0 [s]\n--\n-- Completion code : Successful\n--\n"
-            "---------------------------------------------------\n");
+  EXPECT_EQ(outcome.output, "");
+
+  // A q on standard input that is no terminal cancels nothing.
+  int fds[2];
+  ASSERT_EQ(pipe(fds), 0);
+  ASSERT_EQ(write(fds[1], "q\n", 2), 2);
+  outcome = runChild([] {
+    apvStart("karnet", [] {
+      reportSteps();
+      for (int i = 0; i < 20; ++i, usleep(10000)) {
+        if (apvCancel() != 0) _exit(3);
+      }
+      return 0;
+    });
+  }, {.stdinFd = fds[0]});
+  close(fds[0]);
+  close(fds[1]);
+  EXPECT_EQ(outcome.exitCode, 0);
+  std::string expected = "Interpolating ...\n";
+  for (int percent = 0; percent <= 100; percent += 10) {
+    char line[80];
+    std::snprintf(line, sizeof line, "Interpolating ... %4d%%  time left 0:%02d:%02d  speed 7/s\n",
+                  percent, (100 - percent) / 60, (100 - percent) % 60);
+    expected += line;
+  }
+  EXPECT_EQ(outcome.output, expected);
+}
+
+// A pseudo terminal, 100 columns wide and showing output exactly as written,
+// as the child's standard input, standard error and controlling terminal.
+class TerminalTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    const winsize size{24, 100, 0, 0};
+    ASSERT_EQ(openpty(&master_, &slave_, nullptr, nullptr, &size), 0);
+    termios raw = settings();
+    raw.c_oflag &= ~static_cast<tcflag_t>(OPOST);
+    tcsetattr(slave_, TCSANOW, &raw);
+  }
+  void TearDown() override {
+    close(master_);
+    close(slave_);
+  }
+  termios settings() const {
+    termios now{};
+    tcgetattr(slave_, &now);
+    return now;
+  }
+  // Runs body on the terminal; whenReady is called once the child has written "ready".
+  ChildOutcome run(const std::function<void()>& body,
+                   const std::function<void(pid_t)>& whenReady = {}) {
+    const auto onOutput = [&, ready = false](pid_t child, const std::string& output) mutable {
+      if (!ready && (ready = output.find("ready\n") != std::string::npos) && whenReady) {
+        whenReady(child);
+      }
+    };
+    return runChild(body, {.terminal = master_, .onOutput = onOutput});
+  }
+  int master_ = -1;
+  int slave_ = -1;
+};
+
+// Returns once a cancel is asked for.
+int waitForCancel() {
+  if (apvCancel() != 0) _exit(3);
+  std::fputs("ready\n", stderr);
+  for (int i = 0; i < 500; ++i, usleep(10000)) {
+    if (apvCancel() != 0) return 0;
+  }
+  _exit(4);
+}
+
+// A cancel is taken up at the next report, which ends the run successfully.
+int reportUntilCancelled() {
+  progressStart(1000);
+  progressReport(0);
+  std::fputs("ready\n", stderr);
+  for (int i = 1; i < 500; ++i, usleep(10000)) progressReport(i);
+  _exit(4);
+}
+
+TEST_F(TerminalTest, KeysAndSignalsCancelAndTheTerminalIsRestoredHoweverTheRunEnds) {
+  const termios initial = settings();
+  const auto comparable = [](const termios& t) {
+    return std::tuple(t.c_lflag, t.c_cc[VMIN], t.c_cc[VTIME]);
+  };
+  const struct {
+    int (*computation)();
+    const char* keys;  // typed when the computation is ready, or
+    int signal;        // sent then; an ending signal keeps its outcome: the process ends by it
+    bool cancelled;
+  } cases[] = {
+      {waitForCancel, "xq", 0, false},  // other keys do nothing; q cancels without Enter
+      {reportUntilCancelled, "Q", 0, true},
+      {reportUntilCancelled, "", SIGUSR1, true},
+      {waitForCancel, "", SIGTERM, false},
+      {waitForCancel, "", SIGINT, false},
+      {waitForCancel, "", SIGHUP, false},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(::testing::Message() << c.keys << c.signal);
+    bool keyMode = false;
+    const ChildOutcome outcome = run(
+        [&] {
+          if (c.signal != 0) signal(c.signal, SIG_DFL);
+          apvStart("karnet", c.computation);
+        },
+        [&](pid_t child) {
+          keyMode = (settings().c_lflag & (ICANON | ECHO)) == 0;
+          if (c.signal != 0) kill(child, c.signal);
+          EXPECT_EQ(write(master_, c.keys, std::strlen(c.keys)), std::strlen(c.keys));
+        });
+    const bool ends = c.signal != 0 && c.signal != SIGUSR1;
+    EXPECT_EQ(outcome.exitCode, ends ? -1 : 0);
+    EXPECT_EQ(outcome.signal, ends ? c.signal : 0);
+    EXPECT_EQ(outcome.output.ends_with("Cancel computation\n"), c.cancelled) << outcome.output;
+    EXPECT_TRUE(keyMode);
+    EXPECT_EQ(comparable(settings()), comparable(initial));
+  }
+}
+
+TEST_F(TerminalTest, OneLineIsRewrittenInPlaceAndClearedAtTheEnd) {
+  const std::function<void()> modes[] = {
+      [] { apvStart("karnet", [] { reportSteps(); return 0; }); },
+      [] { reportSteps(); apvShutdown(); },
+  };
+  for (const auto& mode : modes) {
+    const std::string out = run(mode).output;
+    EXPECT_EQ(out.find('\n'), std::string::npos) << out;
+    EXPECT_TRUE(out.starts_with("\rInterpolating ...")) << out;
+    for (const char* line : {"\rInterpolating ... [--------------------]   0%  0:01:40 left  7/s",
+                             "\rInterpolating ... [##########----------]  50%  0:00:50 left  7/s"
+                             "\x1b[K",
+                             "[####################] 100%  0:00:00 left  7/s"}) {
+      EXPECT_NE(out.find(line), std::string::npos) << out;
+    }
+    // Every report is drawn once, with the values of that report.
+    EXPECT_EQ(std::count(out.begin(), out.end(), '%'), 21) << out;
+    EXPECT_TRUE(out.ends_with("\r\x1b[K")) << out;
+  }
+}
+
+TEST_F(TerminalTest, LinesNeverWrapAndMessagesMoveTheProgressLineAside) {
+  std::string text = run([] {
+    apvStatus(std::string(150, 's').c_str());
+    apvProgress(10);
+    apvShutdown();
+  }).output;
+  // The longest text between carriage returns, without the clear-to-end sequences.
+  for (std::size_t at; (at = text.find("\x1b[K")) != std::string::npos;) text.erase(at, 3);
+  std::size_t longest = 0, length = 0;
+  for (char c : text) longest = std::max(longest, length = c == '\r' ? 0 : length + 1);
+  EXPECT_EQ(longest, 99u) << text;  // one column less than the terminal
+
+  EXPECT_EQ(run([] {
+              apvStatus("Saving data ...");
+              apvMessage("\nUnable to allocate memory \n", "karnet", 16);
+              apvMessage("Cancel computation", "", 4);
+            }).output,
+            "\rSaving data ...\x1b[K\r\x1b[Kkarnet: Unable to allocate memory \n"
+            "Cancel computation\n");
 }
 
 }  // namespace

@@ -9,7 +9,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <fstream>
-#include <sstream>
+#include <iterator>
 #include <string>
 #include <vector>
 
@@ -18,22 +18,11 @@
 namespace karnet {
 namespace {
 
-std::string pointerText(const void* p) {
-  char text[64];
-  std::snprintf(text, sizeof text, "%p", const_cast<void*>(p));
-  return text;
-}
-
-std::string readFile(const std::string& path) {
-  std::ifstream in(path);
-  std::stringstream content;
-  content << in.rdbuf();
-  return content.str();
-}
+using Bytes = unsigned char*;
 
 TEST(CheckedAllocTest, UserAreaIsAlignedAndBracketedByGuardWords) {
   for (std::uint64_t size : {0u, 1u, 3u, 8u, 17u, 1000u}) {
-    auto* p = static_cast<unsigned char*>(checkedAlloc(size));
+    auto* p = static_cast<Bytes>(checkedAlloc(size));
     ASSERT_NE(p, nullptr);
     EXPECT_EQ(reinterpret_cast<std::uintptr_t>(p) % 16, 0u) << size;
     EXPECT_EQ(std::memcmp(p - 4, "1234", 4), 0) << size;
@@ -41,95 +30,56 @@ TEST(CheckedAllocTest, UserAreaIsAlignedAndBracketedByGuardWords) {
     std::memset(p, 0xAB, size);
     checkedFree(p);
   }
-}
-
-TEST(CheckedAllocTest, FreedSlotsServeLaterRequests) {
-  // Far more allocations than slots: only works when every free releases its slot.
-  std::vector<void*> live;
-  for (int round = 0; round < 40; ++round) {
-    for (int i = 0; i < 100; ++i) live.push_back(checkedAlloc(24));
-    // Free in an order other than the allocation order.
-    for (std::size_t i = live.size(); i-- > 0;) checkedFree(live[i]);
-    live.clear();
-  }
-  SUCCEED();
-}
-
-TEST(CheckedAllocTest, ArraysHoldTheirElementCount) {
+  // An array's size is its element count times the element size.
   auto* values = checkedAllocArray<double>(1000);
-  for (int i = 0; i < 1000; ++i) values[i] = i * 0.5;
-  EXPECT_EQ(std::memcmp(reinterpret_cast<unsigned char*>(values) + 8000, "9876", 4), 0);
-  EXPECT_EQ(values[999], 499.5);
+  EXPECT_EQ(std::memcmp(reinterpret_cast<Bytes>(values) + 8000, "9876", 4), 0);
   checkedFree(values);
 }
 
-// The guard and pointer checks: the block is made here, the damage and the
-// free happen in the forked child, so the reported pointer is known.
-class CheckedFreeDeathTest : public ::testing::Test {
- protected:
-  void SetUp() override { GTEST_FLAG_SET(death_test_style, "fast"); }
-};
-
-TEST_F(CheckedFreeDeathTest, WritingPastTheEndIsCaughtAtFree) {
-  auto* p = static_cast<unsigned char*>(checkedAlloc(10));
-  EXPECT_EXIT(
-      {
-        p[10] = 'x';
-        checkedFree(p);
-      },
-      ::testing::ExitedWithCode(1), "Memory corrupted \\(high\\); ptr = " + pointerText(p) + "\n");
-  checkedFree(p);
+// The block is made here; the damage and the free happen in the forked child.
+TEST(CheckedAllocDeathTest, DamageAndBadPointersEndTheRunThroughTheReport) {
+  GTEST_FLAG_SET(death_test_style, "fast");
+  const std::string path = "/tmp/karnet_alloc_log" + std::to_string(getpid());
+  struct Case {
+    void (*act)(Bytes p);  // p: a live block of 10 bytes
+    const char* message;   // a regular expression
+    bool namesPointer;
+  };
+  const Case cases[] = {
+      {[](Bytes p) { p[10] = 'x'; checkedFree(p); }, "Memory corrupted \\(high\\)", true},
+      {[](Bytes p) { p[-1] = 0; checkedFree(p); }, "Memory corrupted \\(low\\)", true},
+      {[](Bytes p) { p[-4] = 0; p[10] = 0; checkedFree(p); }, "Memory corrupted \\(low\\)", true},
+      {[](Bytes p) { checkedFree(p); std::fputs("freed\n", stderr); checkedFree(p); },
+       "freed\nNot a valid pointer", false},
+      {[](Bytes p) { checkedFree(p + 4); }, "Not a valid pointer", false},
+      {[](Bytes) { int onStack = 0; checkedFree(&onStack); }, "Not a valid pointer", false},
+      {[](Bytes) { checkedFree(nullptr); }, "Not a valid pointer", false},
+      {[](Bytes p) { memoryError(7, p); }, "unknown memory failure", false},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.message);
+    auto* p = static_cast<Bytes>(checkedAlloc(10));
+    char pointer[64];
+    std::snprintf(pointer, sizeof pointer, "; ptr = %p", static_cast<void*>(p));
+    const std::string expected =
+        std::string("^") + c.message + (c.namesPointer ? pointer : "") + "\n$";
+    EXPECT_EXIT({ logSetStream(std::fopen(path.c_str(), "w")); c.act(p); },
+                ::testing::ExitedWithCode(1), expected);
+    checkedFree(p);
+    // The message goes to standard error only; the log gets the report alone.
+    std::ifstream in(path);
+    const std::string log{std::istreambuf_iterator<char>(in), {}};
+    EXPECT_EQ(log.rfind("\n--------------- RUN TIME INFORMATION", 0), 0u) << log;
+    EXPECT_NE(log.find("-- Completion code : Abnormal\n"), std::string::npos) << log;
+  }
+  std::remove(path.c_str());
 }
 
-TEST_F(CheckedFreeDeathTest, WritingBeforeTheStartIsCaughtAtFree) {
-  auto* p = static_cast<unsigned char*>(checkedAlloc(10));
-  EXPECT_EXIT(
-      {
-        p[-1] = 0;
-        checkedFree(p);
-      },
-      ::testing::ExitedWithCode(1), "Memory corrupted \\(low\\); ptr = " + pointerText(p) + "\n");
-  checkedFree(p);
-}
-
-TEST_F(CheckedFreeDeathTest, LowGuardIsCheckedBeforeHighGuard) {
-  auto* p = static_cast<unsigned char*>(checkedAlloc(4));
-  EXPECT_EXIT(
-      {
-        p[-4] = 0;
-        p[4] = 0;
-        checkedFree(p);
-      },
-      ::testing::ExitedWithCode(1), "\\(low\\)");
-  checkedFree(p);
-}
-
-TEST_F(CheckedFreeDeathTest, SecondFreeOfABlockIsNotAValidPointer) {
-  void* p = checkedAlloc(32);
-  EXPECT_EXIT(
-      {
-        checkedFree(p);
-        std::fputs("first free done\n", stderr);
-        checkedFree(p);
-      },
-      ::testing::ExitedWithCode(1), "first free done\nNot a valid pointer\n");
-  checkedFree(p);
-}
-
-TEST_F(CheckedFreeDeathTest, PointersNotFromTheAllocatorAreRejected) {
-  int onStack = 0;
-  EXPECT_EXIT(checkedFree(&onStack), ::testing::ExitedWithCode(1), "^Not a valid pointer\n$");
-  EXPECT_EXIT(checkedFree(nullptr), ::testing::ExitedWithCode(1), "^Not a valid pointer\n$");
-  // An address inside a live block is not the block's pointer.
-  auto* p = static_cast<unsigned char*>(checkedAlloc(16));
-  EXPECT_EXIT(checkedFree(p + 4), ::testing::ExitedWithCode(1), "^Not a valid pointer\n$");
-  checkedFree(p);
-}
-
-TEST_F(CheckedFreeDeathTest, RequestsThePlatformCannotServeEndTheRun) {
+TEST(CheckedAllocDeathTest, RequestsThePlatformCannotServeEndTheRun) {
 #ifdef KARNET_SANITIZED
   GTEST_SKIP() << "the address sanitizer reports failed allocations on its own";
 #endif
+  GTEST_FLAG_SET(death_test_style, "fast");
   EXPECT_EXIT(checkedAlloc(UINT64_MAX), ::testing::ExitedWithCode(1), "^Memory exhausted\n$");
   EXPECT_EXIT(checkedAlloc(std::uint64_t{1} << 52), ::testing::ExitedWithCode(1),
               "^Memory exhausted\n$");
@@ -138,35 +88,9 @@ TEST_F(CheckedFreeDeathTest, RequestsThePlatformCannotServeEndTheRun) {
               "^Memory exhausted\n$");
 }
 
-TEST_F(CheckedFreeDeathTest, ErrorsEndTheRunThroughTheRunTimeReport) {
-  char path[] = "/tmp/karnet_alloc_logXXXXXX";
-  const int fd = mkstemp(path);
-  ASSERT_GE(fd, 0);
-  close(fd);
-  EXPECT_EXIT(
-      {
-        logSetStream(std::fopen(path, "w"));
-        checkedFree(nullptr);
-      },
-      ::testing::ExitedWithCode(1), "Not a valid pointer");
-  const std::string log = readFile(path);
-  // The allocator's message goes to stderr only; the log gets the report.
-  EXPECT_EQ(log.find("Not a valid pointer"), std::string::npos) << log;
-  EXPECT_NE(log.find("-- Completion code : Abnormal\n"), std::string::npos) << log;
-  std::remove(path);
-}
-
-TEST_F(CheckedFreeDeathTest, UnknownErrorCodesHaveTheirOwnMessage) {
-  EXPECT_EXIT(memoryError(7, nullptr), ::testing::ExitedWithCode(1), "^unknown memory failure\n$");
-}
-
-// Tests that need an allocator nobody has used yet run in a fresh process.
-class FreshAllocatorDeathTest : public ::testing::Test {
- protected:
-  void SetUp() override { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
-};
-
-TEST_F(FreshAllocatorDeathTest, At512LiveBlocksTheTableIsFull) {
+// These need an allocator nobody has used yet: each runs in a fresh process.
+TEST(CheckedAllocDeathTest, TableLimitAndQ84DebugInAFreshProcess) {
+  GTEST_FLAG_SET(death_test_style, "threadsafe");
   EXPECT_EXIT(
       {
         std::vector<void*> blocks;
@@ -177,39 +101,20 @@ TEST_F(FreshAllocatorDeathTest, At512LiveBlocksTheTableIsFull) {
         checkedAlloc(8);
       },
       ::testing::ExitedWithCode(1), "^512 live\nNo free slots for memeory allocation\n$");
-}
-
-TEST_F(FreshAllocatorDeathTest, Q84DebugFillsNewBlocksAndIsReadOnce) {
+  // Q84DEBUG fills every new block, and is read at the first allocation only.
   EXPECT_EXIT(
       {
         setenv("Q84DEBUG", "", 1);
-        auto* first = static_cast<unsigned char*>(checkedAlloc(64));
+        auto* first = static_cast<Bytes>(checkedAlloc(64));
         unsetenv("Q84DEBUG");
-        // A large block comes as fresh zero pages from the system unless filled.
-        constexpr std::size_t kLarge = 4 << 20;
-        auto* large = static_cast<unsigned char*>(checkedAlloc(kLarge));
-        bool filled = true;
-        for (int i = 0; i < 64; ++i) filled = filled && first[i] == 0xFF;
-        for (std::size_t i = 0; i < kLarge; i += 4093) filled = filled && large[i] == 0xFF;
-        filled = filled && large[kLarge - 1] == 0xFF;
+        constexpr std::size_t kLarge = 4 << 20;  // comes as fresh zero pages unless filled
+        auto* large = static_cast<Bytes>(checkedAlloc(kLarge));
+        const bool filled = first[0] == 0xFF && first[63] == 0xFF && large[0] == 0xFF &&
+                            large[kLarge / 2] == 0xFF && large[kLarge - 1] == 0xFF;
         std::fputs(filled ? "filled\n" : "not filled\n", stderr);
         std::exit(0);
       },
       ::testing::ExitedWithCode(0), "^filled\n$");
-}
-
-TEST_F(FreshAllocatorDeathTest, Q84DebugSetAfterTheFirstBlockHasNoEffect) {
-  EXPECT_EXIT(
-      {
-        unsetenv("Q84DEBUG");
-        checkedAlloc(16);
-        setenv("Q84DEBUG", "1", 1);
-        constexpr std::size_t kLarge = 4 << 20;
-        auto* large = static_cast<unsigned char*>(checkedAlloc(kLarge));
-        std::fputs(large[kLarge / 2] == 0xFF ? "filled\n" : "not filled\n", stderr);
-        std::exit(0);
-      },
-      ::testing::ExitedWithCode(0), "^not filled\n$");
 }
 
 }  // namespace
