@@ -1,10 +1,11 @@
 // The bathymetry reader and the result writer on real files: what they take
 // from and put into the gridded-file layer.
 #include <gtest/gtest.h>
-#include <netcdf.h>
 
+#include <algorithm>
 #include <cmath>
 #include <string>
+#include <tuple>
 #include <utility>
 #include <vector>
 
@@ -18,166 +19,108 @@
 namespace karnet {
 namespace {
 
-using test::ScratchDir;
+constexpr double kD = kDeleteValueDouble;
 
-struct Description {
-  FileDescription* d;
-  explicit Description(std::int32_t dimension) : d(descriptionNew(dimension)) {}
-  ~Description() { descriptionFree(d); }
+// A description and grid as the bathymetry reader's callers hold them.
+struct Bathymetry {
+  FileDescription* d = descriptionNew(2);
+  FloatGrid2D grid;
+  ~Bathymetry() {
+    grid2DFree(grid);
+    descriptionFree(d);
+  }
+  int read(const std::string& path, int wantValues = 1) {
+    return bathymetryRead(path.c_str(), *d, wantValues, grid);
+  }
 };
 
-struct Grid2D {
-  FloatGrid2D g;
-  ~Grid2D() { grid2DFree(g); }
-};
+class BathymetryReadFile : public test::ScratchTest {};
+class ResultWriteFile : public test::ScratchTest {};
 
 float depthAt(std::size_t i, std::size_t j) { return -1.0f - static_cast<float>(i + 1000 * j); }
 
-// ---- bathymetry reader ----------------------------------------------------
-
-TEST(BathymetryReadFile, AxesOriginBlockStatisticsAndValues) {
-  ScratchDir dir;
-  const std::string path = dir.file("bathy.nc");
+TEST_F(BathymetryReadFile, AxesOriginBlockStatisticsAndValues) {
   test::makeBathymetry(path, 120, 80, 50.0, 25.0, depthAt);
-  Description desc(2);
-  Grid2D grid;
-  ASSERT_EQ(bathymetryRead(path.c_str(), *desc.d, 1, grid.g), 1);
-  const FileDescription& d = *desc.d;
-  EXPECT_EQ(d.axes[1].lastIndex, 119);
-  EXPECT_EQ(d.axes[2].lastIndex, 79);
-  EXPECT_EQ(d.axes[1].spacing, 50.0f);
-  EXPECT_EQ(d.axes[2].spacing, 25.0f);
-  EXPECT_EQ(d.axes[1].start, 0.0f);
-  EXPECT_EQ(d.axes[1].factor, 1.0f);
-  EXPECT_EQ(d.axes[1].origin, 9.1234);
-  EXPECT_EQ(d.axes[2].origin, 55.321);
-  EXPECT_EQ(d.misc[0], 12.5);
-  EXPECT_EQ(d.misc[2], -900.0);
-  EXPECT_EQ(d.misc[3], 10.0);
+  Bathymetry b;
+  ASSERT_EQ(b.read(path), 1);
+  const FileDescription& d = *b.d;
+  for (int a : {1, 2}) {  // last index, spacing, start, factor, origin
+    EXPECT_EQ(std::vector<double>({double(d.axes[a].lastIndex), d.axes[a].spacing,
+                                   d.axes[a].start, d.axes[a].factor, d.axes[a].origin}),
+              a == 1 ? std::vector<double>({119, 50, 0, 1, 9.1234})
+                     : std::vector<double>({79, 25, 0, 1, 55.321}));
+  }
+  EXPECT_EQ(std::vector<double>({d.misc[0], d.misc[2], d.misc[3]}),
+            std::vector<double>({12.5, -900, 10}));
   EXPECT_EQ(d.items[1].values[1], depthAt(119, 79));  // the minimum
   EXPECT_EQ(d.items[1].values[2], depthAt(0, 0));
-  ASSERT_NE(grid.g.data, nullptr);
-  EXPECT_EQ(grid.g.nj, 120);
-  EXPECT_EQ(grid.g.nk, 80);
-  EXPECT_EQ(grid.g.elementCount(), 9600);
-  EXPECT_EQ(grid.g.at(7, 0), depthAt(7, 0));
-  EXPECT_EQ(grid.g.at(3, 41), depthAt(3, 41));
-
+  ASSERT_NE(b.grid.data, nullptr);
+  EXPECT_EQ(b.grid.nj, 120);
+  EXPECT_EQ(b.grid.nk, 80);
+  EXPECT_EQ(b.grid.at(7, 0), depthAt(7, 0));
+  EXPECT_EQ(b.grid.at(3, 41), depthAt(3, 41));
   // A second read replaces the values with those of the file again.
-  grid.g.at(3, 41) = 5.0f;
-  ASSERT_EQ(bathymetryRead(path.c_str(), *desc.d, 1, grid.g), 1);
-  EXPECT_EQ(grid.g.at(3, 41), depthAt(3, 41));
+  b.grid.at(3, 41) = 5.0f;
+  ASSERT_EQ(b.read(path), 1);
+  EXPECT_EQ(b.grid.at(3, 41), depthAt(3, 41));
 }
 
-TEST(BathymetryReadFile, MiscBlockFoundByThePrefixRule) {
-  const std::vector<float> a = {1, 2, 3, 4, 5, 6, 7};
-  const std::vector<float> b = {11, 12, 13, 14, 15, 16, 17};
-  struct Case {
-    const char* what;
-    std::vector<std::pair<const char*, std::vector<float>>> blocks;
-    double expectedFirst;  // misc 1, or the delete value when no block matches
+// Only as many characters as the block's name has (at most eight) are
+// compared with "Q84_Misc"; the first match wins; what a short block lacks
+// stays at the delete value, as does everything when no block matches.
+TEST_F(BathymetryReadFile, MiscBlockByThePrefixRule) {
+  const std::string a = " = 1.f, 2.f, 3.f, 4.f, 5.f, 6.f, 7.f;", b = " = 11.f, 12.f, 13.f, 14.f;";
+  const std::vector<double> ofA = {1, 2, 3, 4, 7}, none = {kD, kD, kD, kD, kD};
+  const std::tuple<const char*, std::string, std::vector<double>> cases[] = {
+      {"longer name", ":Q84_MiscExtra" + a, ofA},
+      {"shorter name", ":Q84" + a, ofA},
+      {"differs within eight", ":Q84_Mist" + a, none},
+      {"first match wins", ":Other" + b + " :Q8" + a + " :Q84_Misc" + b, ofA},
+      {"no block", "", none},
+      {"short block", ":Q84_Misc = 3.f, 4.f, 5.f;", {3, 4, 5, kD, kD}},
   };
-  const Case cases[] = {
-      {"longer name", {{"Q84_MiscExtra", a}}, 1},
-      {"shorter name", {{"Q84", a}}, 1},
-      {"differs within eight", {{"Q84_Mist", a}}, -1e-30},
-      {"first match wins", {{"Other", b}, {"Q8", a}, {"Q84_Misc", b}}, 1},
-      {"no block", {}, -1e-30},
-  };
-  ScratchDir dir;
-  for (const Case& c : cases) {
-    const std::string path = dir.file("blocks.nc");
-    {
-      test::NcBuilder nc(path);
-      const int y = nc.dim("y", 2), x = nc.dim("x", 2);
-      nc.coordinate("x", x, 1.0);
-      nc.coordinate("y", y, 1.0);
-      const int v = nc.var("bathymetry", NC_FLOAT, {y, x});
-      nc.crs();
-      for (const auto& block : c.blocks) {
-        test::ncCheck(nc_put_att_float(nc.id(), NC_GLOBAL, block.first, NC_FLOAT,
-                                       block.second.size(), block.second.data()),
-                      "block");
-      }
-      nc.endDef();
-      nc.put(v, std::vector<float>{-1, -2, -3, -4});
-      nc.close();
-    }
-    Description desc(2);
-    Grid2D grid;
-    ASSERT_EQ(bathymetryRead(path.c_str(), *desc.d, 0, grid.g), 1) << c.what;
-    EXPECT_EQ(desc.d->misc[0], c.expectedFirst) << c.what;
-    EXPECT_EQ(grid.g.data, nullptr) << c.what;
+  for (const auto& [what, blocks, misc] : cases) {
+    SCOPED_TRACE(what);
+    test::makeBathymetry(path, 2, 2, 1, 1, depthAt, blocks);
+    Bathymetry bathy;
+    ASSERT_EQ(bathy.read(path, 0), 1);
+    const double* m = bathy.d->misc;
+    EXPECT_EQ(std::vector<double>({m[0], m[1], m[2], m[3], m[6]}), misc);
+    EXPECT_EQ(bathy.grid.data, nullptr);  // no values asked for
   }
 }
 
-TEST(BathymetryReadFile, ShortBlockLeavesTheRestAtTheDeleteValue) {
-  ScratchDir dir;
-  const std::string path = dir.file("short.nc");
-  test::makeBathymetry(path, 2, 2, 1, 1, depthAt, {{"Q84_Misc", {3.0f, 4.0f, 5.0f}}});
-  Description desc(2);
-  Grid2D grid;
-  ASSERT_EQ(bathymetryRead(path.c_str(), *desc.d, 1, grid.g), 1);
-  EXPECT_EQ(desc.d->misc[2], 5.0);
-  EXPECT_EQ(desc.d->misc[3], kDeleteValueDouble);
-  EXPECT_EQ(desc.d->misc[6], kDeleteValueDouble);
-}
-
-TEST(BathymetryReadFile, FilesItCannotUse) {
-  ScratchDir dir;
+TEST_F(BathymetryReadFile, FilesItCannotUse) {
   test::writeBytes(dir.file("text.nc"), "not a grid\n");
-  {
-    // A 3-D item: axis type 10, not 5.
-    test::NcBuilder nc(dir.file("cube.nc"));
-    const int z = nc.dim("z", 2), y = nc.dim("y", 2), x = nc.dim("x", 2);
-    nc.coordinate("x", x, 1.0);
-    nc.coordinate("y", y, 1.0);
-    nc.coordinate("z", z, 1.0);
-    nc.var("b", NC_FLOAT, {z, y, x});
-    nc.crs();
-    nc.close();
-  }
-  {
-    // No crs variable.
-    test::NcBuilder nc(dir.file("nocrs.nc"));
-    const int y = nc.dim("y", 2), x = nc.dim("x", 2);
-    nc.coordinate("x", x, 1.0);
-    nc.coordinate("y", y, 1.0);
-    nc.var("b", NC_FLOAT, {y, x});
-    nc.close();
-  }
-  {
-    // Only coordinates: no item at all.
-    test::NcBuilder nc(dir.file("noitem.nc"));
-    nc.coordinate("x", nc.dim("x", 2), 1.0);
-    nc.crs();
-    nc.close();
-  }
+  const std::pair<const char*, std::string> files[] = {
+      {"cube.nc", "dimensions: z = 2; y = 2; x = 2;\nvariables: double x(x); x:spacing = 1.; "
+                  "double y(y); y:spacing = 1.; double z(z); z:spacing = 1.; float b(z, y, x);" +
+                      test::crs()},
+      {"nocrs.nc", test::plane(2, 2) + "float b(y, x);"},
+      {"noitem.nc", test::plane(2, 2) + test::crs()},
+  };
+  for (const auto& [name, cdl] : files) test::makeNc(dir.file(name), cdl);
   for (const char* name : {"missing.nc", "text.nc", "cube.nc", "nocrs.nc", "noitem.nc"}) {
-    Description desc(2);
-    Grid2D grid;
-    EXPECT_EQ(bathymetryRead(dir.file(name).c_str(), *desc.d, 1, grid.g), 0) << name;
+    Bathymetry b;
+    EXPECT_EQ(b.read(dir.file(name)), 0) << name;
   }
 }
-
-// ---- result writer --------------------------------------------------------
 
 struct ResultSetup {
-  Description desc{3};
+  FileDescription* d = descriptionNew(3);
   std::vector<float> values;
   FloatGrid3D grid;
   ResultSetup(std::int32_t nx, std::int32_t ny, std::int32_t nz) {
-    FileDescription& d = *desc.d;
-    d.axes[1].lastIndex = nx - 1;
-    d.axes[2].lastIndex = ny - 1;
-    d.axes[3].lastIndex = nz - 1;
-    d.axes[1].spacing = 50.0f;
-    d.axes[2].spacing = 40.0f;
-    d.axes[3].spacing = 1.0f;
-    d.axes[1].origin = 9.25;
-    d.axes[2].origin = 55.5;
-    const double misc[7] = {3.5, -1e-30, -900.0, 0.0, -1e-30, -1e-30, -1e-30};
-    for (int i = 0; i < 7; ++i) d.misc[i] = misc[i];
+    const std::int32_t counts[3] = {nx, ny, nz};
+    const float spacings[3] = {50.0f, 40.0f, 1.0f};
+    for (int a = 0; a < 3; ++a) {
+      d->axes[a + 1].lastIndex = counts[a] - 1;
+      d->axes[a + 1].spacing = spacings[a];
+    }
+    d->axes[1].origin = 9.25;
+    d->axes[2].origin = 55.5;
+    const double misc[7] = {3.5, kD, -900.0, 0.0, kD, kD, kD};
+    std::copy(misc, misc + 7, d->misc);
     values.resize(static_cast<std::size_t>(nx) * ny * nz);
     for (std::size_t i = 0; i < values.size(); ++i) values[i] = static_cast<float>(i);
     grid.nj = nx;
@@ -186,77 +129,55 @@ struct ResultSetup {
     grid.total = static_cast<std::int64_t>(values.size());
     grid.data = values.data();
   }
+  ~ResultSetup() { descriptionFree(d); }
+  int write(const std::string& path, int writeValues, std::int32_t type, const char* proj) {
+    return resultWrite(path.c_str(), *d, writeValues, type, grid, proj);
+  }
 };
 
-TEST(ResultWriteFile, OneTimeStepXFastest) {
-  ScratchDir dir;
-  const std::string path = dir.file("result.nc");
+TEST_F(ResultWriteFile, OneTimeStepXFastest) {
   ResultSetup r(120, 80, 20);
-  ASSERT_EQ(resultWrite(path.c_str(), *r.desc.d, 1, 2, r.grid, "UTM-32"), 1);
+  ASSERT_EQ(r.write(path, 1, 2, "UTM-32"), 1);
 
   GrdHeader* header = nullptr;
   GrdFile* file = nullptr;
   ASSERT_EQ(grdFileRead(path.c_str(), &header, &file), 0);
-  GrdItem* item = grdItemD(header, 1);
-  EXPECT_EQ(grdGetItemAxisType(item), 10);
+  EXPECT_EQ(grdGetItemAxisType(grdItemD(header, 1)), 10);
   std::vector<float> back(192000, -1.0f);
   double time = -1;
   ASSERT_EQ(grdReadItemTimeStep(header, file, &time, back.data()), 0);
   EXPECT_EQ(time, 0.0);
-  EXPECT_EQ(back, r.values);
+  EXPECT_TRUE(back == r.values);
   EXPECT_NE(grdReadItemTimeStep(header, file, &time, back.data()), 0);  // only one step
-  std::string projection;
-  double lon = 0, lat = 0, orientation = 0;
-  ASSERT_EQ(grdGetGeoInfoUTMProj(header, &projection, &lon, &lat, &orientation), 0);
-  EXPECT_EQ(projection, "UTM-32");
-  EXPECT_EQ(lon, 9.25);
-  EXPECT_EQ(lat, 55.5);
-  EXPECT_EQ(orientation, 3.5);
-  GrdCustomBlock* block = nullptr;
-  ASSERT_EQ(grdGetCustomBlockRef(header, &block), 0);
-  const char* name = nullptr;
-  std::int32_t count = 0;
-  const float* misc = nullptr;
-  ASSERT_EQ(grdGetCustomBlock(block, nullptr, &name, &count, &misc, nullptr), 0);
-  EXPECT_STREQ(name, "Q84_Misc");
-  ASSERT_EQ(count, 7);
-  EXPECT_EQ(misc[0], 3.5f);
-  EXPECT_EQ(misc[2], -900.0f);
   grdHeaderDestroy(&header);
-
-  const std::string dump = test::commandOutput("ncdump -h '" + path + "'");
-  EXPECT_NE(dump.find("float Temperature(time, z, y, x)"), std::string::npos) << dump;
-  EXPECT_NE(dump.find("x = 120 ;"), std::string::npos);
-  EXPECT_NE(dump.find("z = 20 ;"), std::string::npos);
+  test::expectParts(test::ncdump(path),
+                    {"float Temperature(time, z, y, x)", "x = 120 ;", "y = 80 ;", "z = 20 ;",
+                     "x:spacing = 50. ;", "y:spacing = 40. ;", "crs:projection = \"UTM-32\" ;",
+                     "crs:origin_longitude = 9.25 ;", "crs:origin_latitude = 55.5 ;",
+                     "crs:orientation = 3.5 ;",
+                     ":Q84_Misc = 3.5f, -1.e-30f, -900.f, 0.f, -1.e-30f"});
 }
 
-TEST(ResultWriteFile, WithoutValuesAndWithAnUnknownItemType) {
-  ScratchDir dir;
-  const std::string path = dir.file("empty.nc");
+TEST_F(ResultWriteFile, WithoutValuesAndWithAnUnknownItemType) {
   ResultSetup r(3, 2, 2);
-  ASSERT_EQ(resultWrite(path.c_str(), *r.desc.d, 0, 77, r.grid, "LOCAL"), 1);
-  const std::string dump = test::commandOutput("ncdump -h '" + path + "'");
-  EXPECT_NE(dump.find("time = UNLIMITED ; // (0 currently)"), std::string::npos) << dump;
-  EXPECT_NE(dump.find("float item_77(time, z, y, x)"), std::string::npos) << dump;
-  EXPECT_NE(dump.find(":Q84_Misc = 3.5f, -1.e-30f, -900.f, 0.f"), std::string::npos) << dump;
-  EXPECT_NE(dump.find("crs:projection = \"LOCAL\""), std::string::npos) << dump;
+  ASSERT_EQ(r.write(path, 0, 77, "LOCAL"), 1);
+  test::expectParts(test::ncdump(path), {"time = UNLIMITED ; // (0 currently)",
+                                         "float item_77(time, z, y, x)",
+                                         ":Q84_Misc = 3.5f, -1.e-30f, -900.f, 0.f",
+                                         "crs:projection = \"LOCAL\""});
 }
 
-TEST(ResultWriteFile, FailureKeepsTheEarlierResult) {
-  ScratchDir dir;
-  const std::string path = dir.file("result.nc");
+TEST_F(ResultWriteFile, FailureKeepsTheEarlierResult) {
   test::writeBytes(path, "earlier result");
   ResultSetup bad(3, 2, 2);
-  bad.desc.d->axes[2].origin = std::nan("");  // no place for the origin
-  EXPECT_EQ(resultWrite(path.c_str(), *bad.desc.d, 1, 2, bad.grid, "LOCAL"), 0);
+  bad.d->axes[2].origin = std::nan("");  // no place for the origin
+  EXPECT_EQ(bad.write(path, 1, 2, "LOCAL"), 0);
   ResultSetup noLevels(3, 2, 0);
-  EXPECT_EQ(resultWrite(path.c_str(), *noLevels.desc.d, 1, 2, noLevels.grid, "LOCAL"), 0);
+  EXPECT_EQ(noLevels.write(path, 1, 2, "LOCAL"), 0);
   EXPECT_EQ(test::readBytes(path), "earlier result");
-  EXPECT_EQ(dir.entries(), std::vector<std::string>{"result.nc"});
+  EXPECT_EQ(dir.entries(), std::vector<std::string>{"test.nc"});
   ResultSetup good(3, 2, 2);
-  EXPECT_EQ(resultWrite(dir.file("sub/result.nc").c_str(), *good.desc.d, 1, 2, good.grid,
-                        "LOCAL"),
-            0);
+  EXPECT_EQ(good.write(dir.file("sub/result.nc"), 1, 2, "LOCAL"), 0);
 }
 
 }  // namespace

@@ -1,15 +1,14 @@
-// Writing gridded files: the layout of a written file, item naming, refused
-// settings, and files that appear under their name only when complete.
+// Writing gridded files: the layout of a written file, item naming and units,
+// refused settings, and files that appear under their name only when complete.
 #include <gtest/gtest.h>
-#include <netcdf.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cmath>
 #include <csignal>
 #include <cstdlib>
+#include <filesystem>
 #include <string>
 #include <vector>
 
@@ -19,17 +18,18 @@
 namespace karnet {
 namespace {
 
-using test::ScratchDir;
+using test::expectParts;
 
 constexpr float kMisc[7] = {12.5f, -1e-30f, -900.0f, 10.0f, -1e-30f, -1e-30f, -1e-30f};
+const std::string kEarlier = "earlier result";
 
 // A header described the way the result writer describes one.
 struct ResultHeader {
   GrdHeader* header = nullptr;
   GrdFile* file = nullptr;
-  ResultHeader(std::int32_t itemType, const char* key, std::int32_t unit, const char* projection,
-               std::int32_t nx = 4, std::int32_t ny = 3, std::int32_t nz = 2,
-               const char* title = "") {
+  explicit ResultHeader(std::int32_t itemType = 2, const char* key = "Temperature",
+                        std::int32_t unit = 2, const char* projection = "LOCAL",
+                        const char* title = "") {
     EXPECT_EQ(grdHeaderCreate(1, "unused.nc", title, 1, 1, 2, &header), 0);
     EXPECT_EQ(grdSetDeleteValFloat(header, -1e-30f), 0);
     EXPECT_EQ(grdSetDeleteValDouble(header, -1e-30), 0);
@@ -38,8 +38,7 @@ struct ResultHeader {
     GrdItem* item = grdItemD(header, 1);
     EXPECT_EQ(grdSetItemInfo(header, item, itemType, key, unit, 1), 0);
     EXPECT_EQ(grdSetItemUnitConversion(item, 3, 0), 0);
-    EXPECT_EQ(grdSetItemAxisEqD3(item, 1000, nx, ny, nz, 0.0f, 0.0f, 0.0f, 50.0f, 25.0f, 2.5f),
-              0);
+    EXPECT_EQ(grdSetItemAxisEqD3(item, 1000, 4, 3, 2, 0.0f, 0.0f, 0.0f, 50.0f, 25.0f, 2.5f), 0);
     EXPECT_EQ(grdAddCustomBlock(header, 1, "Q84_Misc", 7, kMisc), 0);
     EXPECT_EQ(grdSetGeoInfoUTMProj(header, projection, 9.5, 55.25, 12.5), 0);
   }
@@ -54,166 +53,46 @@ struct ResultHeader {
   int close() { return grdFileClose(header, &file); }
 };
 
-std::vector<float> ramp(std::size_t count) {
-  std::vector<float> v(count);
-  for (std::size_t i = 0; i < count; ++i) v[i] = static_cast<float>(i) * 0.5f;
+class GridFileWrite : public test::ScratchTest {};
+class GridFileWriteAtomic : public test::ScratchTest {};
+
+std::vector<float> ramp(float first = 0.0f) {
+  std::vector<float> v(24);
+  for (std::size_t i = 0; i < v.size(); ++i) v[i] = first + static_cast<float>(i) * 0.5f;
   return v;
 }
 
-std::string textAtt(int ncid, int varid, const char* name) {
-  std::size_t length = 0;
-  if (nc_inq_attlen(ncid, varid, name, &length) != NC_NOERR) return "<none>";
-  std::string text(length, '\0');
-  nc_get_att_text(ncid, varid, name, text.data());
-  return text;
-}
-
-double numberAtt(int ncid, int varid, const char* name) {
-  double v = std::nan("");
-  nc_get_att_double(ncid, varid, name, &v);
-  return v;
-}
-
-int varId(int ncid, const char* name) {
-  int id = -1;
-  nc_inq_varid(ncid, name, &id);
-  return id;
-}
-
-std::vector<double> coordinate(int ncid, const char* name, std::size_t n) {
-  std::vector<double> v(n, -1);
-  nc_get_var_double(ncid, varId(ncid, name), v.data());
-  return v;
-}
-
-// ---- what a written file holds --------------------------------------------
-
-TEST(GridFileWriteLayout, ResultFileReadsBackThroughNetcdf) {
-  ScratchDir dir;
-  const std::string path = dir.file("result.nc");
-  ResultHeader r(2, "Temperature", 2, "UTM-32", 4, 3, 2, "a run");
+TEST_F(GridFileWrite, ResultFileLayout) {
+  ResultHeader r(2, "Temperature", 2, "UTM-32", "a run");
   ASSERT_EQ(r.create(path), 0);
-  ASSERT_EQ(r.write(ramp(24)), 0);
+  ASSERT_EQ(r.write(ramp(), 0.0), 0);
+  ASSERT_EQ(r.write(ramp(100.0f), 60.0), 0);
   ASSERT_EQ(r.close(), 0);
 
-  int ncid = -1;
-  ASSERT_EQ(nc_open(path.c_str(), NC_NOWRITE, &ncid), NC_NOERR);
-  int format = 0;
-  nc_inq_format(ncid, &format);
-  EXPECT_EQ(format, NC_FORMAT_NETCDF4);
-  int unlimited = -1;
-  nc_inq_unlimdim(ncid, &unlimited);
-  char name[NC_MAX_NAME + 1];
-  std::size_t length = 0;
-  ASSERT_EQ(nc_inq_dim(ncid, unlimited, name, &length), NC_NOERR);
-  EXPECT_STREQ(name, "time");
-  EXPECT_EQ(length, 1u);
-
-  const int item = varId(ncid, "Temperature");
-  ASSERT_GE(item, 0);
-  int ndims = 0, dims[NC_MAX_VAR_DIMS];
-  nc_inq_varndims(ncid, item, &ndims);
-  nc_inq_vardimid(ncid, item, dims);
-  ASSERT_EQ(ndims, 4);
-  std::vector<std::string> dimNames;
-  for (int d = 0; d < ndims; ++d) {
-    nc_inq_dimname(ncid, dims[d], name);
-    dimNames.push_back(name);
-  }
-  EXPECT_EQ(dimNames, (std::vector<std::string>{"time", "z", "y", "x"}));
-  std::vector<float> values(24);
-  nc_get_var_float(ncid, item, values.data());
-  EXPECT_EQ(values, ramp(24));
-  float fill = 0;
-  nc_get_att_float(ncid, item, "_FillValue", &fill);
-  EXPECT_EQ(fill, -1e-30f);
-  EXPECT_EQ(textAtt(ncid, item, "long_name"), "Temperature");
-  EXPECT_EQ(textAtt(ncid, item, "units"), "degree_Celsius");
-  EXPECT_EQ(textAtt(ncid, item, "standard_name"), "sea_water_temperature");
-  EXPECT_EQ(textAtt(ncid, item, "grid_mapping"), "crs");
-  int itemType = 0;
-  nc_get_att_int(ncid, item, "item_type", &itemType);
-  EXPECT_EQ(itemType, 2);
-
-  EXPECT_EQ(coordinate(ncid, "x", 4), (std::vector<double>{0, 50, 100, 150}));
-  EXPECT_EQ(coordinate(ncid, "y", 3), (std::vector<double>{0, 25, 50}));
-  EXPECT_EQ(coordinate(ncid, "z", 2), (std::vector<double>{0, 2.5}));
-  EXPECT_EQ(coordinate(ncid, "time", 1), (std::vector<double>{0}));
-  EXPECT_EQ(numberAtt(ncid, varId(ncid, "z"), "spacing"), 2.5);
-  EXPECT_EQ(textAtt(ncid, varId(ncid, "x"), "axis"), "X");
-  EXPECT_EQ(textAtt(ncid, varId(ncid, "x"), "units"), "m");
-  EXPECT_EQ(textAtt(ncid, varId(ncid, "time"), "units"), "seconds since 1900-02-28 00:00:00");
-
-  const int crs = varId(ncid, "crs");
-  EXPECT_EQ(textAtt(ncid, crs, "projection"), "UTM-32");
-  EXPECT_EQ(numberAtt(ncid, crs, "origin_longitude"), 9.5);
-  EXPECT_EQ(numberAtt(ncid, crs, "origin_latitude"), 55.25);
-  EXPECT_EQ(numberAtt(ncid, crs, "orientation"), 12.5);
-  EXPECT_NE(textAtt(ncid, crs, "crs_wkt").find("UTM zone 32N"), std::string::npos);
-
-  EXPECT_EQ(textAtt(ncid, NC_GLOBAL, "Conventions"), "CF-1.8");
-  EXPECT_EQ(textAtt(ncid, NC_GLOBAL, "title"), "a run");
-  float misc[7] = {};
-  nc_type type = NC_NAT;
-  nc_inq_att(ncid, NC_GLOBAL, "Q84_Misc", &type, &length);
-  EXPECT_EQ(type, NC_FLOAT);
-  EXPECT_EQ(length, 7u);
-  nc_get_att_float(ncid, NC_GLOBAL, "Q84_Misc", misc);
-  EXPECT_TRUE(std::equal(misc, misc + 7, kMisc));
-  nc_close(ncid);
+  EXPECT_EQ(test::ncdump(path, "-k"), "netCDF-4\n");
+  const std::string dump = test::ncdump(path, "-v x,y,z,time,Temperature");
+  expectParts(dump, {"time = UNLIMITED ; // (2 currently)", "float Temperature(time, z, y, x) ;",
+                     "Temperature:_FillValue = -1.e-30f ;",
+                     "Temperature:long_name = \"Temperature\" ;",
+                     "Temperature:units = \"degree_Celsius\" ;",
+                     "Temperature:standard_name = \"sea_water_temperature\" ;",
+                     "Temperature:grid_mapping = \"crs\" ;", "Temperature:item_type = 2 ;",
+                     "x:axis = \"X\" ;", "x:units = \"m\" ;", "z:spacing = 2.5 ;",
+                     "time:units = \"seconds since 1900-02-28 00:00:00\" ;",
+                     "crs:projection = \"UTM-32\" ;", "crs:origin_longitude = 9.5 ;",
+                     "crs:origin_latitude = 55.25 ;", "crs:orientation = 12.5 ;", "UTM zone 32N",
+                     ":Conventions = \"CF-1.8\" ;", ":title = \"a run\" ;",
+                     ":Q84_Misc = 12.5f, -1.e-30f, -900.f, 10.f, -1.e-30f, -1.e-30f, -1.e-30f ;",
+                     " x = 0, 50, 100, 150 ;", " y = 0, 25, 50 ;", " z = 0, 2.5 ;",
+                     " time = 0, 60 ;"});
+  // Stored as given: x fastest, then y, then z, then time.
+  expectParts(dump, {" Temperature =\n  0, 0.5, 1, 1.5,\n  2, 2.5, 3, 3.5,\n",
+                     "  10, 10.5, 11, 11.5,\n  100, 100.5, 101, 101.5,\n",
+                     "  110, 110.5, 111, 111.5 ;"});
 }
 
-TEST(GridFileWriteLayout, NcdumpSeesTheLayoutAndOurReaderReadsItBack) {
-  ScratchDir dir;
-  const std::string path = dir.file("dump.nc");
-  ResultHeader r(6, "Current speed", 6, "LOCAL");
-  ASSERT_EQ(r.create(path), 0);
-  ASSERT_EQ(r.write(ramp(24), 0.0), 0);
-  ASSERT_EQ(r.write(ramp(24), 60.0), 0);
-  ASSERT_EQ(r.close(), 0);
-
-  const std::string dump = test::commandOutput("ncdump -h '" + path + "'");
-  EXPECT_NE(dump.find("time = UNLIMITED ; // (2 currently)"), std::string::npos) << dump;
-  EXPECT_NE(dump.find("float Current_speed(time, z, y, x)"), std::string::npos) << dump;
-  EXPECT_NE(dump.find("Current_speed:standard_name = \"sea_water_speed\""), std::string::npos);
-  EXPECT_NE(dump.find("Current_speed:units = \"m s-1\""), std::string::npos);
-  EXPECT_NE(dump.find(":Q84_Misc = 12.5f, -1.e-30f, -900.f, 10.f"), std::string::npos) << dump;
-  EXPECT_NE(dump.find(":Conventions = \"CF-1.8\""), std::string::npos);
-  // LOCAL has no place on the earth: no WKT; an empty title writes none.
-  EXPECT_EQ(dump.find("crs_wkt"), std::string::npos);
-  EXPECT_EQ(dump.find(":title"), std::string::npos);
-
-  GrdHeader* header = nullptr;
-  GrdFile* file = nullptr;
-  ASSERT_EQ(grdFileRead(path.c_str(), &header, &file), 0);
-  ASSERT_EQ(grdGetNoOfItems(header), 1);
-  GrdItem* item = grdItemD(header, 1);
-  EXPECT_EQ(grdGetItemAxisType(item), 10);
-  double low = 0, high = 0;
-  ASSERT_EQ(grdGetItemStatsGlobal(item, &low, &high, nullptr), 0);
-  EXPECT_EQ(low, 0.0);
-  EXPECT_EQ(high, 11.5);
-  std::string projection;
-  double lon = 0, lat = 0, orientation = 0;
-  ASSERT_EQ(grdGetGeoInfoUTMProj(header, &projection, &lon, &lat, &orientation), 0);
-  EXPECT_EQ(projection, "LOCAL");
-  EXPECT_EQ(lon, 9.5);
-  std::vector<float> step(24);
-  double time = -1;
-  ASSERT_EQ(grdFindBlockDynamic(header, file), 0);
-  ASSERT_EQ(grdReadItemTimeStep(header, file, &time, step.data()), 0);
-  ASSERT_EQ(grdReadItemTimeStep(header, file, &time, step.data()), 0);
-  EXPECT_EQ(time, 60.0);
-  EXPECT_EQ(step, ramp(24));
-  grdHeaderDestroy(&header);
-  EXPECT_EQ(header, nullptr);
-}
-
-// A 2-D item without a time axis is the bathymetry layout; the reader takes
-// it as axis type 5 with its spacings, and it has exactly one step.
-TEST(GridFileWriteLayout, TwoDimensionalFileWithoutTime) {
-  ScratchDir dir;
-  const std::string path = dir.file("bathy.nc");
+// A 2-D item without a time axis is the bathymetry layout, with one step only.
+TEST_F(GridFileWrite, TwoDimensionalFileWithoutTime) {
   GrdHeader* header = nullptr;
   ASSERT_EQ(grdHeaderCreate(1, path.c_str(), "", 1, 1, 2, &header), 0);
   GrdItem* item = grdItemD(header, 1);
@@ -229,65 +108,49 @@ TEST(GridFileWriteLayout, TwoDimensionalFileWithoutTime) {
   EXPECT_EQ(file, nullptr);
   grdHeaderDestroy(&header);
 
-  const std::string dump = test::commandOutput("ncdump -h '" + path + "'");
-  EXPECT_NE(dump.find("float bathymetry(y, x)"), std::string::npos) << dump;
-  EXPECT_NE(dump.find("bathymetry:units = \"m\""), std::string::npos) << dump;
-  EXPECT_EQ(dump.find("time"), std::string::npos) << dump;
-
-  GrdFile* readFile = nullptr;
-  ASSERT_EQ(grdFileRead(path.c_str(), &header, &readFile), 0);
-  std::int32_t j0, k0, nx, ny;
-  double x0, y0;
-  float dx, dy;
-  EXPECT_EQ(grdGetItemAxisType(grdItemD(header, 1)), 5);
-  ASSERT_EQ(grdGetItemAxisEqD2(grdItemD(header, 1), &j0, &k0, &nx, &ny, &x0, &y0, &dx, &dy), 0);
-  EXPECT_EQ(nx, 3);
-  EXPECT_EQ(ny, 2);
-  EXPECT_EQ(dx, 40.0f);
-  EXPECT_EQ(dy, 30.0f);
-  std::vector<float> back(6);
-  ASSERT_EQ(grdReadItemTimeStep(header, readFile, nullptr, back.data()), 0);
-  EXPECT_EQ(back, data);
-  grdHeaderDestroy(&header);
+  const std::string dump = test::ncdump(path, "-v x,y,bathymetry");
+  expectParts(dump, {"float bathymetry(y, x) ;", "bathymetry:units = \"m\" ;", " x = 0, 40, 80 ;",
+                     " y = 0, 30 ;", "bathymetry =\n  -1, -2, -3,\n  -4, -5, -6 ;"});
+  // No time; LOCAL has no place on the earth: no WKT; an empty title writes none.
+  for (const char* absent : {"time", "crs_wkt", ":title"}) {
+    EXPECT_EQ(dump.find(absent), std::string::npos) << absent << "\n" << dump;
+  }
 }
 
-TEST(GridFileWriteLayout, ItemNamesFromKeyTexts) {
+// The item's variable name comes from its key text, its units and standard
+// name from the unit table.
+TEST_F(GridFileWrite, ItemNamesAndUnits) {
   struct Case {
     std::int32_t type;
     const char* key;
     std::int32_t unit;
-    const char* variable;
-    const char* units;
-    const char* standardName;
+    std::string variable, units;
+    std::string standardName;  // empty: none
   };
   const Case cases[] = {
-      {99, "", 0, "item_99", "1", "<none>"},
-      {9, "Concentration", 9, "Concentration", "mg l-1", "<none>"},
+      {99, "", 0, "item_99", "1", ""},
+      {9, "Concentration", 9, "Concentration", "mg l-1", ""},
       {3, "S/alt (psu)", 3, "S_alt__psu_", "1e-3", "sea_water_salinity"},
-      {1, "x", 1, "x_1", "1", "<none>"},
+      {1, "x", 1, "x_1", "1", ""},  // not the name of a coordinate
+      {6, "Current speed", 6, "Current_speed", "m s-1", "sea_water_speed"},
+      {5, "Oxygen", 5, "Oxygen", "umol kg-1", "moles_of_oxygen_per_unit_mass_in_sea_water"},
   };
-  ScratchDir dir;
   for (const Case& c : cases) {
-    const std::string path = dir.file("names.nc");
     {
-      ResultHeader r(c.type, c.key, c.unit, "LOCAL", 2, 2, 1);
+      ResultHeader r(c.type, c.key, c.unit, "LOCAL");
       ASSERT_EQ(r.create(path), 0) << c.key;
       ASSERT_EQ(r.close(), 0) << c.key;
     }
-    int ncid = -1;
-    ASSERT_EQ(nc_open(path.c_str(), NC_NOWRITE, &ncid), NC_NOERR);
-    const int item = varId(ncid, c.variable);
-    EXPECT_GE(item, 0) << c.variable;
-    EXPECT_EQ(textAtt(ncid, item, "long_name"), c.key);
-    EXPECT_EQ(textAtt(ncid, item, "units"), c.units);
-    EXPECT_EQ(textAtt(ncid, item, "standard_name"), c.standardName);
-    nc_close(ncid);
+    const std::string dump = test::ncdump(path);
+    const std::string& v = c.variable;
+    expectParts(dump, {"float " + v + "(time, z, y, x) ;",
+                       v + ":long_name = \"" + c.key + "\" ;", v + ":units = \"" + c.units + "\""});
+    EXPECT_EQ(dump.find(":standard_name") != std::string::npos, !c.standardName.empty());
+    if (!c.standardName.empty()) expectParts(dump, {v + ":standard_name = \"" + c.standardName});
   }
 }
 
-// ---- settings that are refused ----------------------------------------------
-
-TEST(GridFileWriteRefusals, AxesBlocksAndGeographicInformation) {
+TEST_F(GridFileWrite, RefusedSettingsAndPlaces) {
   GrdHeader* header = nullptr;
   EXPECT_NE(grdHeaderCreate(0, "a.nc", "", 1, 1, 2, &header), 0);
   EXPECT_EQ(header, nullptr);
@@ -295,137 +158,108 @@ TEST(GridFileWriteRefusals, AxesBlocksAndGeographicInformation) {
   GrdItem* item = grdItemD(header, 1);
   EXPECT_EQ(grdItemD(header, 2), nullptr);
   EXPECT_NE(grdSetItemAxisEqD3(item, 1001, 2, 2, 2, 0, 0, 0, 1, 1, 1), 0);  // not metres
-  EXPECT_NE(grdSetItemAxisEqD3(item, 1000, 0, 2, 2, 0, 0, 0, 1, 1, 1), 0);
   EXPECT_NE(grdSetItemAxisEqD3(item, 1000, 2, 2, 2, 0, 0, 0, 1, -1, 1), 0);
   EXPECT_NE(grdSetItemAxisEqD3(item, 1000, 2, 2, 2, NAN, 0, 0, 1, 1, 1), 0);
   EXPECT_NE(grdSetItemAxisEqD3(item, 1000, 70000, 70000, 1, 0, 0, 0, 1, 1, 1), 0);
   EXPECT_EQ(grdSetItemAxisEqD3(item, 1000, 2, 2, 1, 0, 0, 0, 1, 1, 0), 0);  // one level
+  for (const char* name : {"", "title", "_Hidden"}) {
+    EXPECT_NE(grdAddCustomBlock(header, 1, name, 7, kMisc), 0) << name;
+  }
   EXPECT_NE(grdAddCustomBlock(header, 2, "Q84_Misc", 7, kMisc), 0);
-  EXPECT_NE(grdAddCustomBlock(header, 1, "", 7, kMisc), 0);
-  EXPECT_NE(grdAddCustomBlock(header, 1, "title", 7, kMisc), 0);
-  EXPECT_NE(grdAddCustomBlock(header, 1, "_Hidden", 7, kMisc), 0);
   EXPECT_NE(grdAddCustomBlock(header, 1, "Q84_Misc", 7, nullptr), 0);
   EXPECT_NE(grdAddCustomBlock(header, 1, "Q84_Misc", -1, kMisc), 0);
   EXPECT_EQ(grdAddCustomBlock(header, 1, "Q84_Misc", 7, kMisc), 0);
   EXPECT_NE(grdAddCustomBlock(header, 1, "Q84_Misc", 7, kMisc), 0);  // twice
   EXPECT_NE(grdSetGeoInfoUTMProj(header, nullptr, 0, 0, 0), 0);
-  EXPECT_NE(grdSetGeoInfoUTMProj(header, "LOCAL", NAN, 0, 0), 0);
   EXPECT_NE(grdSetGeoInfoUTMProj(header, "LOCAL", 0, 0, INFINITY), 0);
   // The item has no key text and type yet: no file.
-  ScratchDir dir;
   GrdFile* file = nullptr;
   EXPECT_NE(grdFileCreate(dir.file("a.nc").c_str(), header, &file), 0);
-  EXPECT_TRUE(dir.entries().empty());
   grdHeaderDestroy(&header);
-}
 
-TEST(GridFileWriteRefusals, PlacesWhereNoFileCanBe) {
-  ScratchDir dir;
-  ResultHeader r(2, "Temperature", 2, "LOCAL");
-  EXPECT_NE(r.create(dir.file("no/such/dir/r.nc")), 0);
-  EXPECT_NE(r.create(dir.path()), 0);
-  EXPECT_NE(r.create(dir.path() + "/"), 0);
-  EXPECT_NE(r.create(""), 0);
+  ResultHeader r;
+  for (const std::string& place : {dir.file("no/such/dir/r.nc"), dir.path(), dir.path() + "/",
+                                   std::string()}) {
+    EXPECT_NE(r.create(place), 0) << place;
+  }
   EXPECT_TRUE(dir.entries().empty());
   // Once a file is open, a second one is refused and the header is fixed.
-  ASSERT_EQ(r.create(dir.file("r.nc")), 0);
+  ASSERT_EQ(r.create(path), 0);
   GrdFile* second = nullptr;
   EXPECT_NE(grdFileCreate(dir.file("s.nc").c_str(), r.header, &second), 0);
   EXPECT_NE(grdSetDeleteValFloat(r.header, 0.0f), 0);
   EXPECT_NE(grdWriteItemTimeStep(r.header, r.file, 0.0, nullptr), 0);
 }
 
-// ---- a file appears whole or not at all -------------------------------------
-
-TEST(GridFileWriteAtomic, NothingUnderTheNameBeforeClose) {
-  ScratchDir dir;
-  const std::string path = dir.file("r.nc");
-  test::writeBytes(path, "earlier result");
-  ResultHeader r(2, "Temperature", 2, "LOCAL");
-  ASSERT_EQ(r.create(path), 0);
-  ASSERT_EQ(r.write(ramp(24)), 0);
-  EXPECT_EQ(test::readBytes(path), "earlier result");
-  EXPECT_EQ(dir.entries(), std::vector<std::string>{"r.nc"});
-  ASSERT_EQ(r.close(), 0);
-  EXPECT_EQ(r.file, nullptr);
-  EXPECT_EQ(dir.entries(), std::vector<std::string>{"r.nc"});
-  EXPECT_EQ(test::readBytes(path).substr(1, 3), "HDF");
-}
-
-TEST(GridFileWriteAtomic, AbandonAndDestroyKeepTheEarlierFile) {
-  ScratchDir dir;
-  const std::string kept = dir.file("kept.nc");
-  test::writeBytes(kept, "earlier result");
+// Until it is closed, a file is not under its name: an earlier file stays,
+// and an abandoned file, one whose header goes first or one that cannot take
+// its name leaves nothing.
+TEST_F(GridFileWriteAtomic, FileAppearsOnlyWhenClosed) {
+  const std::vector<std::string> onlyR = {"test.nc"};
+  test::writeBytes(path, kEarlier);
   {
-    ResultHeader r(2, "Temperature", 2, "LOCAL");
-    ASSERT_EQ(r.create(kept), 0);
-    ASSERT_EQ(r.write(ramp(24)), 0);
+    ResultHeader r;
+    ASSERT_EQ(r.create(path), 0);
+    ASSERT_EQ(r.write(ramp()), 0);
+    EXPECT_EQ(test::readBytes(path), kEarlier);
+    EXPECT_EQ(dir.entries(), onlyR);
     ASSERT_EQ(grdFileAbandon(r.header, &r.file), 0);
     EXPECT_EQ(r.file, nullptr);
     EXPECT_NE(grdFileClose(r.header, &r.file), 0);
   }
   {
-    // The header goes while its file is still open.
-    ResultHeader r(2, "Temperature", 2, "LOCAL");
+    ResultHeader r;
     ASSERT_EQ(r.create(dir.file("never.nc")), 0);
-    ASSERT_EQ(r.write(ramp(24)), 0);
-    GrdFile* open = r.file;
-    r.file = nullptr;
-    (void)open;
+    ASSERT_EQ(r.write(ramp()), 0);
+    r.file = nullptr;  // the header is destroyed while its file is open
   }
-  EXPECT_EQ(test::readBytes(kept), "earlier result");
-  EXPECT_EQ(dir.entries(), std::vector<std::string>{"kept.nc"});
-}
+  EXPECT_EQ(test::readBytes(path), kEarlier);
+  EXPECT_EQ(dir.entries(), onlyR);
 
-TEST(GridFileWriteAtomic, FailedCloseLeavesNoTrace) {
-  ScratchDir dir;
-  const std::string path = dir.file("r.nc");
-  ResultHeader r(2, "Temperature", 2, "LOCAL");
+  ResultHeader r;
   ASSERT_EQ(r.create(path), 0);
-  ASSERT_EQ(r.write(ramp(24)), 0);
-  // The name has become a directory in the meantime: the rename fails.
-  ASSERT_EQ(mkdir(path.c_str(), 0700), 0);
-  test::writeBytes(path + "/inside", "x");
-  EXPECT_NE(r.close(), 0);
+  ASSERT_EQ(r.write(ramp()), 0);
+  EXPECT_EQ(test::readBytes(path), kEarlier);
+  ASSERT_EQ(r.close(), 0);
   EXPECT_EQ(r.file, nullptr);
-  EXPECT_EQ(dir.entries(), std::vector<std::string>{"r.nc"});
-  EXPECT_EQ(test::readBytes(path + "/inside"), "x");
+  EXPECT_EQ(dir.entries(), onlyR);
+  EXPECT_EQ(test::readBytes(path).substr(1, 3), "HDF");
+
+  // The name has become a directory in the meantime: the rename fails.
+  const std::string taken = dir.file("taken.nc");
+  ResultHeader failing;
+  ASSERT_EQ(failing.create(taken), 0);
+  ASSERT_EQ(failing.write(ramp()), 0);
+  ASSERT_EQ(mkdir(taken.c_str(), 0700), 0);
+  EXPECT_NE(failing.close(), 0);
+  EXPECT_EQ(failing.file, nullptr);
+  EXPECT_EQ(dir.entries(), (std::vector<std::string>{"taken.nc", "test.nc"}));
+  EXPECT_TRUE(std::filesystem::is_directory(taken));
 }
 
 // A run that ends while its result is being written, by exit() or killed
 // outright, leaves the earlier result and no temporary file.
-TEST(GridFileWriteAtomic, EndedRunLeavesEarlierResultAndNoTemporary) {
+TEST_F(GridFileWriteAtomic, EndedRunLeavesEarlierResultAndNoTemporary) {
   for (const bool killed : {false, true}) {
-    ScratchDir dir;
-    const std::string path = dir.file("r.nc");
-    test::writeBytes(path, "earlier result");
+    SCOPED_TRACE(killed ? "killed" : "exit()");
+    test::writeBytes(path, kEarlier);
     const pid_t child = fork();
     ASSERT_GE(child, 0);
     if (child == 0) {
-      GrdHeader* header = nullptr;
-      GrdFile* file = nullptr;
-      std::vector<float> data(200 * 200 * 5, 1.0f);
-      if (grdHeaderCreate(1, path.c_str(), "", 1, 1, 2, &header) != 0) _exit(20);
-      GrdItem* item = grdItemD(header, 1);
-      grdSetEqTimeAxis(header, 0, 0.0, 1.0, 0);
-      grdSetItemInfo(header, item, 2, "Temperature", 2, 1);
-      grdSetItemAxisEqD3(item, 1000, 200, 200, 5, 0, 0, 0, 1, 1, 1);
-      grdSetGeoInfoUTMProj(header, "LOCAL", 0, 0, 0);
-      if (grdFileCreate(path.c_str(), header, &file) != 0) _exit(21);
-      if (grdWriteItemTimeStep(header, file, 0.0, data.data()) != 0) _exit(22);
+      ResultHeader r;  // std::exit() does not destroy it
+      if (r.create(path) != 0 || r.write(ramp()) != 0) _exit(21);
       if (killed) raise(SIGKILL);
       std::exit(7);
     }
     int status = 0;
     ASSERT_EQ(waitpid(child, &status, 0), child);
     if (killed) {
-      ASSERT_TRUE(WIFSIGNALED(status));
+      EXPECT_TRUE(WIFSIGNALED(status));
     } else {
-      ASSERT_TRUE(WIFEXITED(status));
-      ASSERT_EQ(WEXITSTATUS(status), 7);
+      EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 7) << status;
     }
-    EXPECT_EQ(test::readBytes(path), "earlier result");
-    EXPECT_EQ(dir.entries(), std::vector<std::string>{"r.nc"});
+    EXPECT_EQ(test::readBytes(path), kEarlier);
+    EXPECT_EQ(dir.entries(), std::vector<std::string>{"test.nc"});
   }
 }
 

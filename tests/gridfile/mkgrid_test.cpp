@@ -1,8 +1,6 @@
 // karnet-mkgrid: reading .asc grids, building the bathymetry, and the program.
 #include <gtest/gtest.h>
-#include <sys/wait.h>
 
-#include <cmath>
 #include <sstream>
 #include <string>
 #include <vector>
@@ -21,52 +19,30 @@ namespace {
 using mkgrid::BuildOptions;
 using mkgrid::EsriGrid;
 using mkgrid::OriginSource;
-using test::ScratchDir;
 
+// Four columns, three rows, the north row first; one NODATA cell.
 constexpr const char* kSmallGrid =
-    "ncols 4\n"
-    "nrows 3\n"
-    "xllcorner 1000\n"
-    "yllcorner 2000\n"
-    "cellsize 50\n"
-    "NODATA_value -9999\n"
-    "-1 -2 -3 -9999\n"
-    "-4 -5 -6 -7\n"
-    "-8 -9 -10 -11\n";
+    "ncols 4\nnrows 3\nxllcorner 1000\nyllcorner 2000\ncellsize 50\nNODATA_value -9999\n"
+    "-1 -2 -3 -9999\n-4 -5 -6 -7\n-8 -9 -10 -11\n";
 
 bool parse(const std::string& text, EsriGrid* grid, std::string* error) {
   std::istringstream in(text);
   return mkgrid::parseEsriAscii(in, grid, error);
 }
 
-// ---- .asc reading ---------------------------------------------------------
-
-TEST(MkgridAscii, HeaderVariantsAndValues) {
+// Centre references, separate dx/dy, any keyword case, values spread over
+// lines as they come, CR LF line ends, no NODATA. (Corner references, cellsize
+// and NODATA are in the grid that the builder and the program read below.)
+TEST(MkgridAscii, HeaderVariants) {
   EsriGrid grid;
   std::string error;
-  ASSERT_TRUE(parse(kSmallGrid, &grid, &error)) << error;
-  EXPECT_EQ(grid.ncols, 4);
-  EXPECT_EQ(grid.nrows, 3);
-  EXPECT_TRUE(grid.xIsCorner);
-  EXPECT_EQ(grid.dx, 50.0);
-  EXPECT_EQ(grid.dy, 50.0);
-  EXPECT_TRUE(grid.isNodata(-9999));
-  ASSERT_EQ(grid.values.size(), 12u);
-  EXPECT_EQ(grid.values[3], -9999.0);
-  EXPECT_EQ(grid.values[11], -11.0);
-
-  // Centre references, separate dx/dy, any keyword case, values spread over
-  // lines as they come, CR LF line ends, no NODATA.
   ASSERT_TRUE(parse("NCOLS 2\r\nNROWS 2\r\nXLLCENTER -5.5\r\nyllcenter 7\r\nDX 10\r\ndy 20\r\n"
                     "1 2 3\r\n4\r\n",
                     &grid, &error))
       << error;
-  EXPECT_FALSE(grid.xIsCorner);
-  EXPECT_FALSE(grid.yIsCorner);
-  EXPECT_EQ(grid.xll, -5.5);
-  EXPECT_EQ(grid.dx, 10.0);
-  EXPECT_EQ(grid.dy, 20.0);
-  EXPECT_FALSE(grid.hasNodata);
+  EXPECT_FALSE(grid.xIsCorner || grid.yIsCorner || grid.hasNodata);
+  EXPECT_EQ(std::vector<double>({grid.xll, grid.yll, grid.dx, grid.dy}),
+            std::vector<double>({-5.5, 7, 10, 20}));
   EXPECT_EQ(grid.values, (std::vector<double>{1, 2, 3, 4}));
 }
 
@@ -97,45 +73,28 @@ TEST(MkgridAscii, FaultsAreNamed) {
     EsriGrid grid;
     std::string error;
     EXPECT_FALSE(parse(c.text, &grid, &error)) << c.text;
-    EXPECT_NE(error.find(c.expected), std::string::npos) << "message: " << error;
+    EXPECT_NE(error.find(c.expected), std::string::npos) << c.text << "\nmessage: " << error;
   }
-  EsriGrid grid;
-  std::string error;
-  EXPECT_FALSE(mkgrid::readEsriAsciiFile("/nonexistent/grid.asc", &grid, &error));
-  EXPECT_NE(error.find("cannot open"), std::string::npos);
 }
 
-// ---- building -------------------------------------------------------------
-
-TEST(MkgridBuild, RowsRunSouthToNorthAndNodataBecomesLand) {
+// Row order, land and the LOCAL origin by default are in the program's test.
+TEST(MkgridBuild, NegatedValuesOrientationAndGivenOrigin) {
   EsriGrid grid;
   std::string error;
   ASSERT_TRUE(parse(kSmallGrid, &grid, &error));
   BuildOptions options;
   options.landValue = 2.5;
-  mkgrid::Bathymetry b;
-  ASSERT_TRUE(mkgrid::buildBathymetry(grid, options, &b, &error)) << error;
-  EXPECT_EQ(b.nx, 4);
-  EXPECT_EQ(b.ny, 3);
-  EXPECT_EQ(b.values,
-            (std::vector<float>{-8, -9, -10, -11, -4, -5, -6, -7, -1, -2, -3, 2.5f}));
-  // LOCAL: the origin is the south-west cell centre in plain metres.
-  EXPECT_EQ(b.longitude, 1025.0);
-  EXPECT_EQ(b.latitude, 2025.0);
-  EXPECT_EQ(b.orientation, 0.0);
-  EXPECT_EQ(b.landValue, 2.5f);
-
   options.negate = true;
   options.hasOrientation = true;
   options.orientation = 30.0;
   options.origin = OriginSource::Projected;
   options.originA = 7.0;
   options.originB = 8.0;
+  mkgrid::Bathymetry b;
   ASSERT_TRUE(mkgrid::buildBathymetry(grid, options, &b, &error)) << error;
-  EXPECT_EQ(b.values[0], 8.0f);
-  EXPECT_EQ(b.values[11], 2.5f);  // land is not negated
-  EXPECT_EQ(b.longitude, 7.0);
-  EXPECT_EQ(b.orientation, 30.0);
+  EXPECT_EQ(b.values, (std::vector<float>{8, 9, 10, 11, 4, 5, 6, 7, 1, 2, 3, 2.5f}));  // land kept
+  EXPECT_EQ(std::vector<double>({b.longitude, b.latitude, b.orientation, b.landValue}),
+            std::vector<double>({7, 8, 30, 2.5}));
 }
 
 TEST(MkgridBuild, ProjectedOriginGoesThroughTheProjection) {
@@ -161,52 +120,36 @@ TEST(MkgridBuild, ProjectedOriginGoesThroughTheProjection) {
   options.originA = 10.5;
   options.originB = 56.0;
   ASSERT_TRUE(mkgrid::buildBathymetry(grid, options, &b, &error)) << error;
-  EXPECT_EQ(b.longitude, 10.5);
-  EXPECT_EQ(b.latitude, 56.0);
+  EXPECT_EQ(std::vector<double>({b.longitude, b.latitude}), std::vector<double>({10.5, 56}));
 
   options.projection = "NOT-A-PROJECTION";
   EXPECT_FALSE(mkgrid::buildBathymetry(grid, options, &b, &error));
   EXPECT_NE(error.find("unusable projection"), std::string::npos) << error;
 }
 
-// ---- the program ----------------------------------------------------------
+class MkgridProgram : public test::ScratchTest {};
 
-struct ProgramRun {
-  int exitCode;
-  std::string output;
-};
-
-ProgramRun runMkgrid(const std::string& arguments) {
-  const std::string command = std::string(KARNET_MKGRID_BINARY) + " " + arguments + " 2>&1";
-  ProgramRun run{-1, ""};
-  FILE* pipe = popen(command.c_str(), "r");
-  if (pipe == nullptr) return run;
-  char buffer[4096];
-  std::size_t n;
-  while ((n = std::fread(buffer, 1, sizeof buffer, pipe)) > 0) run.output.append(buffer, n);
-  const int status = pclose(pipe);
-  run.exitCode = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  return run;
+// The program's output, stderr included, and its exit code.
+std::string runMkgrid(const std::string& arguments, int* exitCode) {
+  return test::commandOutput(std::string(KARNET_MKGRID_BINARY) + " " + arguments + " 2>&1",
+                             exitCode);
 }
 
-TEST(MkgridProgram, MakesAFileTheBathymetryReaderTakes) {
-  ScratchDir dir;
+TEST_F(MkgridProgram, MakesAFileTheBathymetryReaderTakes) {
   test::writeBytes(dir.file("in.asc"), kSmallGrid);
-  const ProgramRun run = runMkgrid("--projection LOCAL --land-value=0.5 -o 12 '" + dir.file("in.asc") +
-                            "' '" + dir.file("out.nc") + "'");
-  ASSERT_EQ(run.exitCode, 0) << run.output;
+  int code = -1;
+  const std::string files = "'" + dir.file("in.asc") + "' '" + path + "'";
+  const std::string output = runMkgrid("--projection LOCAL --land-value=0.5 -o 12 " + files, &code);
+  ASSERT_EQ(code, 0) << output;
   FileDescription* d = descriptionNew(2);
   FloatGrid2D grid;
-  ASSERT_EQ(bathymetryRead(dir.file("out.nc").c_str(), *d, 1, grid), 1);
-  EXPECT_EQ(d->axes[1].lastIndex, 3);
-  EXPECT_EQ(d->axes[2].lastIndex, 2);
-  EXPECT_EQ(d->axes[1].spacing, 50.0f);
-  EXPECT_EQ(d->axes[1].origin, 1025.0);
-  EXPECT_EQ(d->axes[2].origin, 2025.0);
-  EXPECT_EQ(d->misc[0], 12.0);
-  EXPECT_EQ(d->misc[2], -900.0);
-  EXPECT_EQ(d->misc[3], 0.5);
-  EXPECT_EQ(d->items[1].values[1], -11.0f);
+  ASSERT_EQ(bathymetryRead(path.c_str(), *d, 1, grid), 1);
+  EXPECT_EQ(std::vector<double>({double(d->axes[1].lastIndex), double(d->axes[2].lastIndex),
+                                 d->axes[1].spacing, d->axes[1].origin, d->axes[2].origin}),
+            std::vector<double>({3, 2, 50, 1025, 2025}));
+  EXPECT_EQ(std::vector<double>({d->misc[0], d->misc[2], d->misc[3]}),
+            std::vector<double>({12, -900, 0.5}));
+  EXPECT_EQ(d->items[1].values[1], -11.0f);  // minimum and maximum, land included
   EXPECT_EQ(d->items[1].values[2], 0.5f);
   EXPECT_EQ(grid.at(0, 0), -8.0f);
   EXPECT_EQ(grid.at(3, 2), 0.5f);
@@ -215,8 +158,7 @@ TEST(MkgridProgram, MakesAFileTheBathymetryReaderTakes) {
   EXPECT_EQ(dir.entries().size(), 2u);
 }
 
-TEST(MkgridProgram, BadInputEndsWithCodeOneAndAMessage) {
-  ScratchDir dir;
+TEST_F(MkgridProgram, BadInputEndsWithCodeOneAndAMessage) {
   test::writeBytes(dir.file("in.asc"), kSmallGrid);
   test::writeBytes(dir.file("bad.asc"), "ncols 2\nnrows 1\nxllcorner 0\nyllcorner 0\n");
   test::writeBytes(dir.file("out.nc"), "earlier");
@@ -238,15 +180,15 @@ TEST(MkgridProgram, BadInputEndsWithCodeOneAndAMessage) {
       {"'" + dir.file("none.asc") + "' " + out, "cannot open"},
       {in + "'" + dir.file("no/dir/out.nc") + "'", "cannot create"},
   };
+  int code = -1;
   for (const Case& c : cases) {
-    const ProgramRun run = runMkgrid(c.arguments);
-    EXPECT_EQ(run.exitCode, 1) << c.arguments;
-    EXPECT_NE(run.output.find(c.expected), std::string::npos) << run.output;
+    const std::string output = runMkgrid(c.arguments, &code);
+    EXPECT_EQ(code, 1) << c.arguments;
+    EXPECT_NE(output.find(c.expected), std::string::npos) << output;
   }
   EXPECT_EQ(test::readBytes(dir.file("out.nc")), "earlier");
-  const ProgramRun help = runMkgrid("--help");
-  EXPECT_EQ(help.exitCode, 0);
-  EXPECT_NE(help.output.find("--land-value"), std::string::npos);
+  EXPECT_NE(runMkgrid("--help", &code).find("--land-value"), std::string::npos);
+  EXPECT_EQ(code, 0);
 }
 
 }  // namespace
