@@ -141,34 +141,5 @@ TEST(ParameterFile, MissingSectionLeavesTheEchoOfTheSectionsBefore) {
   EXPECT_EQ(log.substr(log.size() - runTimeBlock("Abnormal").size()), runTimeBlock("Abnormal"));
 }
 
-TEST(ParameterFile, SyntaxAndConversionErrorsNameFileAndLine) {
-  struct Case {
-    std::string text;
-    std::string where;  // expected "case.pfs:LINE" prefix of the cause line
-  };
-  ParameterFile integerWithFraction;
-  integerWithFraction.zRange = "0, 1.5";
-  ParameterFile unterminatedText;
-  unterminatedText.title = "'no end";
-  std::string unclosed = ParameterFile{}.render();
-  unclosed = unclosed.substr(0, unclosed.rfind("EndSect"));
-  const std::vector<Case> cases = {
-      {integerWithFraction.render(), "case.pfs:10:"},
-      {unterminatedText.render(), "case.pfs:33:"},
-      {unclosed, "case.pfs:"},
-  };
-  for (const Case& c : cases) {
-    TempDir dir;
-    writeFile(dir.file("case.pfs"), c.text);
-    const ProcessResult r = runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}});
-    EXPECT_EQ(r.exitCode, 1);
-    const auto lines = splitLines(readFile(dir.file("case.log")));
-    const auto message = std::find(lines.begin(), lines.end(), "Error in parameter file");
-    ASSERT_NE(message, lines.end()) << c.text;
-    ASSERT_NE(message, lines.begin());
-    EXPECT_NE((message - 1)->find(c.where), std::string::npos) << *(message - 1);
-  }
-}
-
 }  // namespace
 }  // namespace karnet::e2e

@@ -175,16 +175,6 @@ std::string ParameterFile::render() const {
   return p.str();
 }
 
-ProcessResult makeBathymetry(const std::string& dir, const std::string& ascText,
-                             const std::vector<std::string>& mkgridArgs,
-                             const std::string& output) {
-  writeFile(dir + "/bathymetry.asc", ascText);
-  std::vector<std::string> args = mkgridArgs;
-  args.push_back("bathymetry.asc");
-  args.push_back(output);
-  return runProgram(KARNET_MKGRID_BINARY, args, dir);
-}
-
 }  // namespace karnet::e2e
 
 #include <netcdf.h>

@@ -75,12 +75,6 @@ struct ParameterFile {
   std::string render() const;
 };
 
-// A bathymetry made by karnet-mkgrid from an ESRI ASCII grid text; mkgridArgs are the options
-// that come before the input and output names. Returns the tool's result.
-ProcessResult makeBathymetry(const std::string& dir, const std::string& ascText,
-                             const std::vector<std::string>& mkgridArgs,
-                             const std::string& output = "bathymetry.nc");
-
 }  // namespace karnet::e2e
 
 
