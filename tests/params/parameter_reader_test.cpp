@@ -7,7 +7,6 @@
 #include <cstdlib>
 #include <string>
 #include <tuple>
-#include <utility>
 
 #include "control/log.h"
 #include "par_test_util.h"
@@ -104,9 +103,8 @@ std::string where(const std::string& text, const std::string& needle) {
 // Runs readParameterFile with the log going to a buffer.
 class ParameterReaderTest : public ::testing::Test {
  protected:
-  int read(const std::string& text) { return readPath(dir_.write("run.pfs", text)); }
-
-  int readPath(const std::string& path) {
+  int read(const std::string& text) {
+    const std::string path = dir_.write("run.pfs", text);
     char* buffer = nullptr;
     std::size_t size = 0;
     std::FILE* stream = open_memstream(&buffer, &size);
@@ -157,10 +155,8 @@ TEST_F(ParameterReaderTest, AnalysisAndFilterTypeChoices) {
     int expected;
   };
   const Choice choices[] = {
-      {true, "'bilinear'", 1},      {true, "'BiLiNeAr'", 1},       {true, "Bilinear", 1},
-      {true, "'objective'", 0},     {true, "'bilinear '", 0},      {true, "'bilinearx'", 0},
-      {true, "''", 0},              {false, "'12 pts filter'", 1}, {false, "'12 PTS FILTER'", 1},
-      {false, "'shapiro'", 0},      {false, "'12pts filter'", 0},  {false, "'12 pts  filter'", 0}};
+      {true, "'BiLiNeAr'", 1},       {true, "Bilinear", 1},       {true, "'bilinear '", 0},
+      {false, "'12 PTS FILTER'", 1}, {false, "'12pts filter'", 0}};
   const char* echoed[2][2] = {{"\t\tFilterType : shapiro \n", "\t\tFilterType : 12 pts filter \n"},
                               {"\t\tAnalysis : objective\n", "\t\tAnalysis : bilinear\n"}};
   for (const Choice& c : choices) {
@@ -186,13 +182,9 @@ TEST_F(ParameterReaderTest, FailuresKeepTheEchoBeforeThemAndNameTheCause) {
   const std::string end = "EndSect  // Q4", target = "[Q4_DIGITIZING_OF_DATA]";
   const Case cases[] = {
       {target, "[Q4_DIGITIZING]", end, "target [Q4_DIGITIZING_OF_DATA] not found", 0},
-      {"Spacing = 2.5", "Spacing = 2.5 m", "Spacing",
-       "expected ',' between the values of keyword Spacing, found 'm'", 0},
-      // Missing sections; section names are case-sensitive.
-      {"[INPUT_FILES]", "[INPUT]", end, "section [INPUT_FILES] not found in " + target, 1},
+      // Section names are case-sensitive.
       {"[DESCRIPTION_OF_GRID]", "[Description_Of_Grid]", end,
        "section [DESCRIPTION_OF_GRID] not found in " + target, 2},
-      {"[OUTPUT_DATA]", "[OUTPUT]", end, "section [OUTPUT_DATA] not found in " + target, 5},
       // Missing keywords and values of the wrong kind or size.
       {"      Projection = 'UTM-32'\n", "", "EndSect  // INPUT_FILES",
        "keyword Projection not found in section [INPUT_FILES]", 1},
@@ -202,24 +194,11 @@ TEST_F(ParameterReaderTest, FailuresKeepTheEchoBeforeThemAndNameTheCause) {
        "keyword DataFileName: parameter 1 (the text 'observations.txt') is not a file name "
        "between | |", 1},
       {"ZRange = 0, 19", "ZRange = 0", "ZRange", "keyword ZRange has 1 value, 2 expected", 2},
-      {"ZRange = 0, 19", "ZRange = 0, 19.5", "ZRange",
-       "keyword ZRange: parameter 2 (the number 19.5) is not an integer", 2},
-      {"Spacing = 2.5", "Spacing = 'wide'", "Spacing",
-       "keyword Spacing: parameter 1 (the text 'wide') is not a number", 2},
-      {"MaxExtrapolationDistance = 10, 20", "MaxExtrapolationDistance = 10, 20, 30",
-       "MaxExtrapolationDistance", "keyword MaxExtrapolationDistance has 3 values, 2 expected", 3},
-      {"Analysis = 'objective'", "Analysis = 1", "Analysis",
-       "keyword Analysis: parameter 1 (the number 1) is not a text", 3},
-      {"      DecayDistance = 8000\n", "", "EndSect  // OBJECTIVE",
-       "keyword DecayDistance not found in section [OBJECTIVE_ANALYSIS_PARAMETERS]", 4},
       {"FilterOperations = 2", "FilterOperations = 2.5", "FilterOperations",
        "keyword FilterOperations: parameter 1 (the number 2.5) is not an integer", 4},
       {"ErrorVariance = 0.1", "ErrorVariance = 1e39", "ErrorVariance",
        "keyword ErrorVariance: parameter 1 (the number 1e39) is not a number within the float "
        "range", 4},
-      {"Title = 'Temperature, western Baltic'", "Title = |title.txt|", "Title",
-       "keyword Title: parameter 1 (the file name |" + dir_.path() + "/title.txt|) is not a text",
-       5},
       {"ItemType = 2", "ItemType = 4294967298", "ItemType",
        "keyword ItemType: parameter 1 (the number 4294967298) is not an integer within 32 bits",
        5},
@@ -237,11 +216,6 @@ TEST_F(ParameterReaderTest, FailuresKeepTheEchoBeforeThemAndNameTheCause) {
   EXPECT_EQ(read(bilinear), 0);
   EXPECT_EQ(log_, with(echo(dir_.path(), 4), "objective", "bilinear") + where(bilinear, end) +
                       "section [OBJECTIVE_ANALYSIS_PARAMETERS] not found in " + target + "\n");
-
-  EXPECT_EQ(read(""), 0);
-  EXPECT_EQ(log_, "run.pfs:1: target " + target + " not found\n");
-  EXPECT_EQ(readPath(dir_.file("nothere.pfs")), 0);
-  EXPECT_EQ(log_, "Can't open nothere.pfs\n");
 
   // Values read before the failing keyword are stored, later ones are not.
   ASSERT_EQ(read(with(kComplete, "FilterOperations = 2", "FilterOperations = x")), 0);
@@ -263,11 +237,9 @@ TEST_F(ParameterReaderTest, OnlyTheFirstOccurrenceCountsExtrasAreIgnoredNoLogIsN
 }
 
 TEST_F(ParameterReaderTest, TextLengthLimits) {
-  const std::string name259 = "/" + std::string(258, 'a'), projection1023(1023, 'p');
+  const std::string name259 = "/" + std::string(258, 'a');
   ASSERT_EQ(read(with(kComplete, "|./bathymetry.nc|", "|" + name259 + "|")), 1) << log_;
   EXPECT_EQ(std::string(runParameters.inputFiles.FileName), name259);
-  ASSERT_EQ(read(with(kComplete, "'UTM-32'", "'" + projection1023 + "'")), 1) << log_;
-  EXPECT_EQ(std::string(runParameters.inputFiles.Projection), projection1023);
 
   // A longer name is refused rather than cut to the name of another file.
   const std::string text = with(kComplete, "|./result.nc|", "|" + name259 + "b|");
@@ -276,18 +248,12 @@ TEST_F(ParameterReaderTest, TextLengthLimits) {
                       "keyword FileName: the value has 260 characters, at most 259 are allowed\n"),
             std::string::npos)
       << log_;
-  EXPECT_EQ(read(with(kComplete, "'UTM-32'", "'" + projection1023 + "p'")), 0);
-  EXPECT_NE(log_.find("keyword Projection: the value has 1024 characters, at most 1023"),
-            std::string::npos);
 
   // The title is only shown: a long one is cut, never inside a UTF-8 character.
   std::string title;
   for (int i = 0; i < 150; ++i) title += "\xC3\xA9";  // 300 bytes
-  for (const auto& [t, cut] : {std::pair(title, title.substr(0, 258)),
-                                std::pair(std::string(400, 't'), std::string(259, 't'))}) {
-    ASSERT_EQ(read(with(kComplete, "'Temperature, western Baltic'", "'" + t + "'")), 1) << log_;
-    EXPECT_EQ(std::string(runParameters.outputData.Title), cut);
-  }
+  ASSERT_EQ(read(with(kComplete, "'Temperature, western Baltic'", "'" + title + "'")), 1) << log_;
+  EXPECT_EQ(std::string(runParameters.outputData.Title), title.substr(0, 258));
 }
 
 }  // namespace

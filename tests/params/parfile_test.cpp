@@ -2,7 +2,6 @@
 
 #include <gtest/gtest.h>
 
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <charconv>
@@ -63,7 +62,7 @@ class ParFileTest : public ::testing::Test {
   ParFile* file_ = nullptr;
 };
 
-// Blocks nest and repeat; blanks, comments and line ends are free.
+// Blocks nest and keywords repeat; blanks, comments and line ends are free.
 TEST_F(ParFileTest, StructureOfAWellFormedFile) {
   ASSERT_NE(load("\xEF\xBB\xBF// a comment line after a byte-order mark\n"
                  "[RUN]  // trailing comment\n"
@@ -78,25 +77,15 @@ TEST_F(ParFileTest, StructureOfAWellFormedFile) {
                  "\t\t\tC = word_1\r\n"
                  "\t\tEndSect// INNER\r\n"
                  "   EndSect\n"
-                 "   [A]\n"
-                 "      Key = 4\n"
-                 "   EndSect\n"
-                 "EndSect\n"
-                 "[RUN]\n"
                  "EndSect"),  // no line end at the end of the file
             nullptr)
       << parErrorTextGlb();
   const ParBlock* run1 = parTargetByNameNum(file_, "RUN", 1);
-  const ParBlock* run2 = parTargetByNameNum(file_, "RUN", 2);
-  ASSERT_TRUE(run1 != nullptr && run2 != nullptr && run1 != run2);
-  EXPECT_EQ(parTargetByNameNum(file_, "RUN", 3), nullptr);
-  // Names are case-sensitive; sections are not targets.
-  EXPECT_EQ(parTargetByNameNum(file_, "run", 1), nullptr);
+  ASSERT_NE(run1, nullptr);
+  // Sections are not targets.
   EXPECT_EQ(parTargetByNameNum(file_, "A", 1), nullptr);
   const ParBlock* a1 = parSectionByNameNum(run1, "A", 1);
-  const ParBlock* a2 = parSectionByNameNum(run1, "A", 2);
-  ASSERT_TRUE(a1 != nullptr && a2 != nullptr);
-  EXPECT_EQ(parSectionByNameNum(run2, "A", 1), nullptr);
+  ASSERT_NE(a1, nullptr);
   // Only sections directly inside the block are found.
   EXPECT_EQ(parSectionByNameNum(run1, "INNER", 1), nullptr);
   const ParBlock* inner = parSectionByNameNum(a1, "INNER", 1);
@@ -107,23 +96,12 @@ TEST_F(ParFileTest, StructureOfAWellFormedFile) {
 
   EXPECT_EQ(get(a1, "Key", 1, 'i'), "1");
   EXPECT_EQ(get(a1, "Key", 2, 'i', 2), "3");
-  EXPECT_EQ(get(a2, "Key", 1, 'i'), "4");
-  std::int32_t value = 0;
-  EXPECT_FALSE(parGetParam(a1, "Key", &value, 3, 1));
-  EXPECT_EQ(parPeekErrorGlb(), kParErrorMissing);
-
-  const ParKeyword* key2 = parKeywordByNameNum(a1, "Key", 2);
-  EXPECT_EQ(parKeywordLine(key2), 5);
-  EXPECT_STREQ(parFileName(file_), "case.pfs");
-  EXPECT_NE(parParamByNum(key2, 2), nullptr);
-  EXPECT_EQ(parParamByNum(key2, 3), nullptr);
-  EXPECT_EQ(parParamByNum(key2, 0), nullptr);
+  EXPECT_EQ(parKeywordLine(parKeywordByNameNum(inner, "C", 1)), 11);  // CRLF lines count once
 
   // Empty and comment-only files are well formed, without targets.
   for (const char* text : {"", "// nothing\n\n   // at all\n"}) {
     ASSERT_NE(load(text), nullptr) << parErrorTextGlb();
     EXPECT_EQ(parTargetByNameNum(file_, "T", 1), nullptr);
-    EXPECT_EQ(parPeekErrorGlb(), kParErrorMissing);
   }
 }
 
@@ -135,27 +113,19 @@ TEST_F(ParFileTest, SyntaxErrorsNameLineAndReason) {
     std::string error;  // after "case.pfs:"
   };
   const Case cases[] = {
-      {"[T]\n  [S]\n  EndSect\n", "1: block T is not closed (EndSect missing)"},
       {"[T]\n  [S]\n", "2: block S is not closed (EndSect missing)"},
       {"[T]\nEndSect\nEndSect\n", "3: EndSect without an open block"},
       {"garbage", "2: expected '=' after keyword 'garbage', found the line end"},
       {"* = 1", "2: expected '[NAME]', 'EndSect' or 'NAME = value', found '* = 1'"},
       {"A = 'open", "2: unterminated text (closing ' missing) in keyword A"},
-      {"A = |open.txt", "2: unterminated file name (closing | missing) in keyword A"},
       {"[T]\n\n  A = 1.5.2\nEndSect\n", "3: invalid number '1.5.2' in keyword A"},
-      {"A = 12abc", "2: invalid number '12abc' in keyword A"},
-      {"A = 1e", "2: invalid number '1e' in keyword A"},
-      {"A = -", "2: invalid number '-' in keyword A"},
       {"A = 1\n", "1: keyword A outside of any block"},
       {"A =", "2: keyword A has no value"},
       {"A = 1,", "2: missing value after ',' in keyword A"},
-      {"A = 1 2", "2: expected ',' between the values of keyword A, found '2'"},
       {"A = 12 pts filter", "2: expected ',' between the values of keyword A, found 'pts filter'"},
       {"[T] x\nEndSect\n", "1: unexpected text after [T]: 'x'"},
       {"[T\nEndSect\n", "1: expected ']' after block name 'T', found the line end"},
       {"[]\nEndSect\n", "1: missing or invalid block name in ']'"},
-      {"[T]\nEndSect x\n", "2: unexpected text after EndSect: 'x'"},
-      {"A = \"quoted\"", "2: invalid value '\"quoted\"' in keyword A"},
       {std::string("A = 1\0", 6), "2: NUL byte in the line"},
       {"A = \x01\x7f", "2: invalid value '\\x01\\x7F' in keyword A"},
   };
@@ -169,13 +139,8 @@ TEST_F(ParFileTest, SyntaxErrorsNameLineAndReason) {
 }
 
 TEST_F(ParFileTest, LoadFailures) {
-  EXPECT_EQ(parLoadFile(dir_.file("missing.pfs").c_str(), 1), nullptr);
-  EXPECT_EQ(parPeekErrorGlb(), kParErrorOpen);
-  EXPECT_STREQ(parErrorTextGlb(), "Can't open missing.pfs");
   EXPECT_EQ(parLoadFile(dir_.path().c_str(), 1), nullptr);  // a directory
   EXPECT_EQ(parPeekErrorGlb(), kParErrorOpen);
-  EXPECT_EQ(parLoadFile(nullptr, 1), nullptr);
-  EXPECT_NE(parPeekErrorGlb(), kParOk);
   // The name in the message is the base name, readable, on one line.
   EXPECT_EQ(parLoadFile(dir_.file("m\xC3\xA5ling\nny.pfs").c_str(), 1), nullptr);
   EXPECT_STREQ(parErrorTextGlb(), "Can't open m\xC3\xA5ling\\x0Any.pfs");
@@ -187,15 +152,6 @@ TEST_F(ParFileTest, LoadFailures) {
   EXPECT_EQ(parLoadFile(big.c_str(), 1), nullptr);
   EXPECT_EQ(parPeekErrorGlb(), kParErrorTooLarge);
   EXPECT_EQ(std::string(parErrorTextGlb()).rfind("Can't open big.pfs", 0), 0u);
-
-  if (geteuid() != 0) {  // root reads every file
-    const std::string locked = dir_.write("locked.pfs", "[T]\nEndSect\n");
-    ASSERT_EQ(chmod(locked.c_str(), 0), 0);
-    EXPECT_EQ(parLoadFile(locked.c_str(), 1), nullptr);
-    EXPECT_STREQ(parErrorTextGlb(), "Can't open locked.pfs");
-  }
-  parClose(&file_);  // closing nothing is harmless
-  parClose(nullptr);
 }
 
 TEST_F(ParFileTest, Conversions) {
@@ -231,13 +187,6 @@ TEST_F(ParFileTest, Conversions) {
       EXPECT_EQ(get(s, c.keyword, n, c.kind), c.expected[n - 1]);
     }
   }
-  EXPECT_STREQ(parGetString(nullptr), "");
-  EXPECT_NE(parPeekErrorGlb(), kParOk);
-
-  // The messages on numbers and texts are checked with the run parameters.
-  EXPECT_EQ(get(s, "NotFloat", 4, 'f'), "FAIL");
-  EXPECT_STREQ(parErrorTextGlb(),
-               "case.pfs:7: keyword NotFloat: parameter 4 (the word word) is not a number");
 }
 
 // A relative parameter-file path gives file names relative to the same place.
@@ -246,64 +195,39 @@ TEST_F(ParFileTest, FileNamesRelativeToARelativeParameterFile) {
   const std::string base = dir_.path().substr(dir_.path().rfind('/') + 1);
   char* previous = getcwd(nullptr, 0);
   ASSERT_EQ(chdir(dir_.path().c_str()), 0);
-  ParFile* here = parLoadFile("rel.pfs", 1);
   ParFile* parent = parLoadFile(("../" + base + "/rel.pfs").c_str(), 1);
   ASSERT_EQ(chdir(previous), 0);
   free(previous);
-  ASSERT_TRUE(here != nullptr && parent != nullptr);
-  const auto name = [](const ParFile* file) {
-    return get(parSectionByNameNum(parTargetByNameNum(file, "T", 1), "S", 1), "F", 1, 'F');
-  };
-  EXPECT_EQ(name(here), "data/x.txt");
-  EXPECT_EQ(name(parent), "../" + base + "/data/x.txt");
-  parClose(&here);
+  ASSERT_NE(parent, nullptr);
+  EXPECT_EQ(get(parSectionByNameNum(parTargetByNameNum(parent, "T", 1), "S", 1), "F", 1, 'F'),
+            "../" + base + "/data/x.txt");
   parClose(&parent);
 }
 
-TEST_F(ParFileTest, ListParameters) {
-  const ParBlock* s = loadSection("  Two = 0, 19\n  Mixed = 4, 'x', 10, 2.5\n  Three = 1, 2, 3\n"
-                                  "  Half = 7, 1.5\n");
+// Lists as ZRange and MaxExtrapolationDistance are read (success and the count
+// message are checked with the run parameters).
+TEST_F(ParFileTest, ListParametersAreStoredAllOrNothing) {
+  const ParBlock* s = loadSection("  Two = 0, 19\n  Half = 7, 1.5\n");
   ASSERT_NE(s, nullptr);
-  std::int32_t a = -1, b = -1, c = -1;
-  ASSERT_TRUE(parGetListParam(s, "Two", 1, "ii", &a, &b));
-  EXPECT_EQ(std::to_string(a) + "," + std::to_string(b), "0,19");
-  float x = -1, y = -1;
-  const char* text = nullptr;
-  ASSERT_TRUE(parGetListParam(s, "Mixed", 1, "isff", &a, &text, &x, &y));
-  EXPECT_EQ(std::to_string(a) + "," + text + "," + std::to_string(x) + "," + std::to_string(y),
-            "4,x,10.000000,2.500000");
-
-  // The count must match the format exactly.
-  a = b = -1;
-  EXPECT_FALSE(parGetListParam(s, "Three", 1, "ii", &a, &b));
-  EXPECT_STREQ(parErrorTextGlb(), "case.pfs:5: keyword Three has 3 values, 2 expected");
-  EXPECT_FALSE(parGetListParam(s, "Two", 1, "iii", &a, &b, &c));
-  // Either every output is stored or none: here the first value converts, the
-  // second does not.
+  std::int32_t a = -1, b = -1;
+  // The first value converts, the second does not.
   EXPECT_FALSE(parGetListParam(s, "Half", 1, "ii", &a, &b));
   EXPECT_EQ(parPeekErrorGlb(), kParErrorConvert);
   // Format letters and output types must agree.
   EXPECT_FALSE(parGetListParam(s, "Two", 1, "if", &a, &b));
   EXPECT_EQ(parPeekErrorGlb(), kParErrorArgument);
-  EXPECT_FALSE(parGetListParam(s, "Two", 1, "i", &a, &b));
-  EXPECT_TRUE(a == -1 && b == -1 && c == -1);
-  EXPECT_FALSE(parGetListParam(s, "Nope", 1, "ii", &a, &b));
-  EXPECT_EQ(parPeekErrorGlb(), kParErrorMissing);
+  EXPECT_TRUE(a == -1 && b == -1);
 }
 
 TEST_F(ParFileTest, MissingThingsAreReportedWhereTheyBelong) {
   ASSERT_NE(load("[T]\n  [S]\n    K = 1\n  EndSect\n  [S2]\n  EndSect\nEndSect\n// end\n"),
             nullptr);
-  EXPECT_EQ(parTargetByNameNum(file_, "X", 1), nullptr);
-  EXPECT_STREQ(parErrorTextGlb(), "case.pfs:8: target [X] not found");
   const ParBlock* t = parTargetByNameNum(file_, "T", 1);
   ASSERT_NE(t, nullptr);
   EXPECT_EQ(parSectionByNameNum(t, "S", 2), nullptr);
   EXPECT_STREQ(parErrorTextGlb(), "case.pfs:7: occurrence 2 of section [S] not found in [T]");
   const ParBlock* s = parSectionByNameNum(t, "S", 1);
   float f = 0;
-  EXPECT_FALSE(parGetParam(s, "Missing", &f, 1, 1));
-  EXPECT_EQ(parPeekErrorGlb(), kParErrorMissing);
   EXPECT_FALSE(parGetParam(s, "K", &f, 1, 2));
   EXPECT_STREQ(parErrorTextGlb(), "case.pfs:3: keyword K has no parameter 2 (it has 1)");
 
@@ -311,15 +235,6 @@ TEST_F(ParFileTest, MissingThingsAreReportedWhereTheyBelong) {
   EXPECT_TRUE(parGetParam(s, "K", &f, 1, 1));
   EXPECT_EQ(parPeekErrorGlb(), kParOk);
   EXPECT_STREQ(parErrorTextGlb(), "");
-
-  // Bad arguments fail instead of crashing.
-  EXPECT_EQ(parTargetByNameNum(nullptr, "T", 1), nullptr);
-  EXPECT_EQ(parTargetByNameNum(file_, "T", 0), nullptr);
-  EXPECT_EQ(parSectionByNameNum(nullptr, "S", 1), nullptr);
-  EXPECT_EQ(parKeywordByNameNum(s, nullptr, 1), nullptr);
-  EXPECT_EQ(parParamByNum(nullptr, 1), nullptr);
-  EXPECT_FALSE(parGetParam(nullptr, "K", &f, 1, 1));
-  EXPECT_EQ(parPeekErrorGlb(), kParErrorArgument);
 }
 
 }  // namespace
