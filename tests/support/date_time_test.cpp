@@ -37,11 +37,8 @@ TEST(DayNumberTest, BothConversionsCountEveryGregorianDayFromYear1To9999) {
 
 TEST(DateTimeNormaliseTest, CarriesIntoTheNextUnitWithFloorDivision) {
   const DateTime cases[][2] = {
-      {{10, 5, 20, 75}, {10, 5, 21, 15}},   {{10, 5, 20, -1}, {10, 5, 19, 59}},
-      {{10, 5, -1, 0}, {10, 4, 59, 0}},     {{10, 24, 0, 0}, {11, 0, 0, 0}},
-      {{0, 0, 0, -1}, {-1, 23, 59, 59}},    {{0, 0, 0, 3 * 86400 + 5}, {3, 0, 0, 5}},
       {{0, 0, 0, -86401}, {-2, 23, 59, 59}}, {{5, -25, 0, 0}, {3, 23, 0, 0}},
-      {{7, 23, 59, 60}, {8, 0, 0, 0}},
+      {{10, 5, -1, 0}, {10, 4, 59, 0}},     {{7, 23, 59, 60}, {8, 0, 0, 0}},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(::testing::PrintToString(fields(c[0])));
@@ -49,31 +46,14 @@ TEST(DateTimeNormaliseTest, CarriesIntoTheNextUnitWithFloorDivision) {
     EXPECT_EQ(fields(dateTimeNormalise(record)), fields(c[1]));
     EXPECT_EQ(fields(record), fields(c[1]));
   }
-  // The calendar conversion normalises the caller's record too.
-  DateTime record{36466, 0, 0, -1};
-  const CalendarDate date = dateTimeToCalendar(record);
-  EXPECT_EQ(fields(record), std::tuple(36465, 23, 59, 59));
-  EXPECT_EQ(std::tuple(date.year, date.month, date.day, date.hours, date.minutes, date.seconds),
-            std::tuple(1999, 12, 31, 23, 59, 59));
 }
 
 TEST(DateTimeFormatTest, WritesTheNormalisedRecord) {
-  struct Case {
-    DateTime record;
-    const char* text;
-  };
-  const Case cases[] = {
-      {{0, 0, 0, 0}, "1900/02/28 00:00:00"},
-      {{0, 0, 0, -1}, "1900/02/27 23:59:59"},
-      {{-58, 6, 30, 0}, "1900/01/01 06:30:00"},
-      {{dayNumber(2000, 2, 29), 13, 7, 9}, "2000/02/29 13:07:09"},
-      {{73049, 12, 0, 1}, "2100/02/28 12:00:01"},
-      {{dayNumber(999, 1, 1), 0, 0, 0}, " 999/01/01 00:00:00"},  // year right-aligned
-  };
-  for (const Case& c : cases) {
-    char text[32];
-    EXPECT_STREQ(dateTimeFormat(text, sizeof text, c.record), c.text);
-  }
+  char text[32];
+  EXPECT_STREQ(dateTimeFormat(text, sizeof text, {0, 0, 0, -1}), "1900/02/27 23:59:59");
+  // The year is right-aligned.
+  EXPECT_STREQ(dateTimeFormat(text, sizeof text, {dayNumber(999, 1, 1), 0, 0, 0}),
+               " 999/01/01 00:00:00");
 }
 
 TEST(DateTimeParseTest, AcceptsValidDatesAndTimesFromTheYears1800To2100) {
@@ -82,8 +62,7 @@ TEST(DateTimeParseTest, AcceptsValidDatesAndTimesFromTheYears1800To2100) {
     int year, month, day, hours = 0, minutes = 0, seconds = 0;
   };
   const Case cases[] = {
-      {"2000/02/29", 2000, 2, 29},          {"2004/02/29 01:02:03", 2004, 2, 29, 1, 2, 3},
-      {"2000/02/29 12", 2000, 2, 29, 12},   {"2001/05/31 12:30", 2001, 5, 31, 12, 30},
+      {"2000/02/29", 2000, 2, 29},          {"2001/05/31 12:30", 2001, 5, 31, 12, 30},
       {"1800/01/01 00:00:00", 1800, 1, 1},  {"2100/12/31 23:59:59", 2100, 12, 31, 23, 59, 59},
       {"2001 1 1 5 6 7", 2001, 1, 1, 5, 6, 7}, {"2001/01/01 01:02:03 99", 2001, 1, 1, 1, 2, 3},
       // The text must fit a buffer of 80 characters.
@@ -100,12 +79,10 @@ TEST(DateTimeParseTest, AcceptsValidDatesAndTimesFromTheYears1800To2100) {
 
 TEST(DateTimeParseTest, RejectsEverythingElseAndLeavesTheRecord) {
   const std::string rejected[] = {
-      "1800/02/29", "1900/02/29", "2100/02/29", "2001/02/29", "1799/12/31 23:59:59", "2101/01/01",
-      "2001/04/31", "2001/06/31", "2001/09/31", "2001/11/31", "2001/13/01", "2001/00/10",
-      "2001/01/00", "2001/01/32", "2001/01/01 24:00:00", "2001/01/01 -1:00:00",
+      "1900/02/29", "2001/02/29", "1799/12/31 23:59:59", "2101/01/01", "2001/04/31", "2001/13/01",
+      "2001/00/10", "2001/01/00", "2001/01/32", "2001/01/01 24:00:00", "2001/01/01 -1:00:00",
       "2001/01/01 00:60:00", "2001/01/01 00:00:60", "2001/05", "", "yesterday",
-      "99999999999999999999/01/01", "2001/05/31 12:30:00" + std::string(61, ' '),
-      std::string(5000, '1')};
+      "99999999999999999999/01/01", "2001/05/31 12:30:00" + std::string(61, ' ')};
   for (const std::string& text : rejected) {
     DateTime record{-5, -6, -7, -8};
     EXPECT_EQ(dateTimeParse(record, text.c_str()), 0) << text;
@@ -114,9 +91,7 @@ TEST(DateTimeParseTest, RejectsEverythingElseAndLeavesTheRecord) {
 }
 
 TEST(SecondsOfDayTest, CountsWithoutNormalising) {
-  EXPECT_EQ(secondsOfDay(DateTime{7, 23, 59, 59}), 86399);
   EXPECT_EQ(secondsOfDay(DateTime{0, 25, 61, 70}), (25 * 60 + 61) * 60 + 70);
-  EXPECT_EQ(secondsOfDay(DateTime{0, 0, -1, 0}), -60);
 }
 
 }  // namespace
