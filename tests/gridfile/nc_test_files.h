@@ -2,8 +2,7 @@
 #define KARNET_TESTS_GRIDFILE_NC_TEST_FILES_H_
 
 // NetCDF files made on the spot from CDL text (ncgen) with large value arrays
-// put in through the NetCDF C API, a scratch directory that disappears with
-// the test, and shell command output.
+// put in through the NetCDF C API, scratch directories and shell command output.
 
 #include <gtest/gtest.h>
 #include <netcdf.h>
@@ -22,38 +21,32 @@
 
 namespace karnet::test {
 
-class ScratchDir {
- public:
-  ScratchDir() {
-    std::string pattern = (std::filesystem::temp_directory_path() / "karnet-grd-XXXXXX").string();
-    if (mkdtemp(pattern.data()) == nullptr) throw std::runtime_error("mkdtemp");
-    path_ = pattern;
-  }
-  ~ScratchDir() {
+inline std::string makeScratchDir() {
+  std::string pattern = (std::filesystem::temp_directory_path() / "karnet-grd-XXXXXX").string();
+  if (mkdtemp(pattern.data()) == nullptr) throw std::runtime_error("mkdtemp");
+  return pattern;
+}
+
+// Tests that each get a scratch directory, gone with the test, and a file name in it.
+class ScratchTest : public testing::Test {
+ protected:
+  ~ScratchTest() override {
     std::error_code ignored;
-    std::filesystem::remove_all(path_, ignored);
+    std::filesystem::remove_all(dir, ignored);
   }
-  std::string file(const std::string& name) const { return path_ + "/" + name; }
-  const std::string& path() const { return path_; }
+  std::string file(const std::string& name) const { return dir + "/" + name; }
   // Names of everything in the directory, hidden files included, sorted.
   std::vector<std::string> entries() const {
     std::vector<std::string> names;
-    for (const auto& entry : std::filesystem::directory_iterator(path_)) {
+    for (const auto& entry : std::filesystem::directory_iterator(dir)) {
       names.push_back(entry.path().filename().string());
     }
     std::sort(names.begin(), names.end());
     return names;
   }
 
- private:
-  std::string path_;
-};
-
-// Tests that each get a scratch directory and a file name in it.
-class ScratchTest : public testing::Test {
- protected:
-  ScratchDir dir;
-  const std::string path = dir.file("test.nc");
+  const std::string dir = makeScratchDir();
+  const std::string path = file("test.nc");
 };
 
 inline std::string readBytes(const std::string& path) {
