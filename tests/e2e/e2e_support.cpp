@@ -187,12 +187,12 @@ void check(int status, const char* what) {
 }
 }  // namespace
 
-void writeBathymetry(const std::string& path, const BathymetrySpec& spec) {
+void writeBathymetry(const std::string& path, const BathymetrySpec& grid) {
   int nc = 0;
   check(nc_create(path.c_str(), NC_CLOBBER | NC_NETCDF4, &nc), "create");
   int yDim = 0, xDim = 0;
-  check(nc_def_dim(nc, "y", spec.ny, &yDim), "y dim");
-  check(nc_def_dim(nc, "x", spec.nx, &xDim), "x dim");
+  check(nc_def_dim(nc, "y", grid.ny, &yDim), "y dim");
+  check(nc_def_dim(nc, "x", grid.nx, &xDim), "x dim");
   int xVar = 0, yVar = 0, bVar = 0, crs = 0;
   check(nc_def_var(nc, "x", NC_DOUBLE, 1, &xDim, &xVar), "x var");
   check(nc_def_var(nc, "y", NC_DOUBLE, 1, &yDim, &yVar), "y var");
@@ -200,8 +200,8 @@ void writeBathymetry(const std::string& path, const BathymetrySpec& spec) {
     check(nc_put_att_text(nc, v, "units", 1, "m"), "units");
     check(nc_put_att_text(nc, v, "axis", 1, v == xVar ? "X" : "Y"), "axis");
     // A grid without a spacing (one node) gets none.
-    if (spec.spacing > 0) {
-      check(nc_put_att_double(nc, v, "spacing", NC_DOUBLE, 1, &spec.spacing), "spacing");
+    if (grid.spacing > 0) {
+      check(nc_put_att_double(nc, v, "spacing", NC_DOUBLE, 1, &grid.spacing), "spacing");
     }
   }
   const int dims[2] = {yDim, xDim};
@@ -211,28 +211,28 @@ void writeBathymetry(const std::string& path, const BathymetrySpec& spec) {
   check(nc_put_att_text(nc, bVar, "units", 1, "m"), "units");
   check(nc_put_att_text(nc, bVar, "grid_mapping", 3, "crs"), "grid_mapping");
   check(nc_def_var(nc, "crs", NC_INT, 0, nullptr, &crs), "crs");
-  check(nc_put_att_text(nc, crs, "projection", spec.projection.size(), spec.projection.c_str()),
+  check(nc_put_att_text(nc, crs, "projection", grid.projection.size(), grid.projection.c_str()),
         "projection");
-  check(nc_put_att_double(nc, crs, "origin_longitude", NC_DOUBLE, 1, &spec.originLongitude),
+  check(nc_put_att_double(nc, crs, "origin_longitude", NC_DOUBLE, 1, &grid.originLongitude),
         "lon");
-  check(nc_put_att_double(nc, crs, "origin_latitude", NC_DOUBLE, 1, &spec.originLatitude),
+  check(nc_put_att_double(nc, crs, "origin_latitude", NC_DOUBLE, 1, &grid.originLatitude),
         "lat");
-  check(nc_put_att_double(nc, crs, "orientation", NC_DOUBLE, 1, &spec.orientation),
+  check(nc_put_att_double(nc, crs, "orientation", NC_DOUBLE, 1, &grid.orientation),
         "orientation");
   check(nc_put_att_text(nc, NC_GLOBAL, "Conventions", 6, "CF-1.8"), "conventions");
-  const float misc[7] = {static_cast<float>(spec.orientation), -1e-30f, -900.0f, spec.landValue,
+  const float misc[7] = {static_cast<float>(grid.orientation), -1e-30f, -900.0f, grid.landValue,
                          -1e-30f, -1e-30f, -1e-30f};
   check(nc_put_att_float(nc, NC_GLOBAL, "Q84_Misc", NC_FLOAT, 7, misc), "misc");
   check(nc_enddef(nc), "enddef");
-  std::vector<double> xs(spec.nx), ys(spec.ny);
-  for (int i = 0; i < spec.nx; ++i) xs[i] = i * spec.spacing;
-  for (int j = 0; j < spec.ny; ++j) ys[j] = j * spec.spacing;
+  std::vector<double> xs(grid.nx), ys(grid.ny);
+  for (int i = 0; i < grid.nx; ++i) xs[i] = i * grid.spacing;
+  for (int j = 0; j < grid.ny; ++j) ys[j] = j * grid.spacing;
   check(nc_put_var_double(nc, xVar, xs.data()), "x values");
   check(nc_put_var_double(nc, yVar, ys.data()), "y values");
-  if (spec.heights.size() != static_cast<std::size_t>(spec.nx) * spec.ny) {
+  if (grid.heights.size() != static_cast<std::size_t>(grid.nx) * grid.ny) {
     throw std::runtime_error("bathymetry heights do not match the grid");
   }
-  check(nc_put_var_float(nc, bVar, spec.heights.data()), "heights");
+  check(nc_put_var_float(nc, bVar, grid.heights.data()), "heights");
   check(nc_close(nc), "close");
 }
 

@@ -93,7 +93,7 @@ struct BathymetrySpec {
   double orientation = 0.0;
   float landValue = 10.0f;
 };
-void writeBathymetry(const std::string& path, const BathymetrySpec& spec);
+void writeBathymetry(const std::string& path, const BathymetrySpec& grid);
 
 }  // namespace karnet::e2e
 
