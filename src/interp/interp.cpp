@@ -29,11 +29,13 @@ struct InterpolationCounts {
 };
 
 // Working storage of one call: the copy of the layer as it was before its pass
-// (the only data the estimators see) and the count table of that copy.
+// (the only data the estimators see), the count table of that copy and the
+// search hints of the walk over it.
 struct InterpWorkspace {
   FloatGrid2D scratch;
   SearchIndex index;
   bool indexCurrent = false;
+  SearchHints hints;
 };
 
 // Estimate for the empty wet node (j, k) from the data of the scratch layer.
@@ -44,7 +46,7 @@ float estimateNode(std::int32_t j, std::int32_t k, InterpWorkspace& ws, float re
   float f[kHitListSize];
   float w[kHitListSize];
   const FloatGrid2D& data = ws.scratch;
-  const std::int32_t n = search(j, k, data, reach, deleteValue, ws.index, jHit, kHit);
+  const std::int32_t n = search(j, k, data, reach, deleteValue, ws.index, ws.hints, jHit, kHit);
   if (n == 4) {
     for (int i = 1; i <= 4; ++i) f[i] = data.data[std::int64_t{kHit[i]} * data.nj + jHit[i]];
     ++counts.bilinear;

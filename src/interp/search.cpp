@@ -111,9 +111,15 @@ void edgeDistances(std::int32_t j, std::int32_t k, std::int32_t nj, std::int32_t
   edges[3] = std::max(k, nj - 1 - j);
 }
 
-// Rings scanned node by node before the count table is consulted: dense data
-// is found there at once, and the table pays off only for farther data.
-constexpr std::int64_t kDirectRings = 1;
+// Number of data nodes in columns jLo..jHi, rows kLo..kHi (inclusive, inside
+// the layer, not empty).
+std::uint32_t rectangleCount(const SearchIndex& index, std::int64_t jLo, std::int64_t jHi,
+                             std::int64_t kLo, std::int64_t kHi) {
+  const std::int64_t w = std::int64_t{index.nj} + 1;
+  const std::uint32_t* below = index.counts + kLo * w;
+  const std::uint32_t* above = index.counts + (kHi + 1) * w;
+  return above[jHi + 1] - below[jHi + 1] - above[jLo] + below[jLo];
+}
 
 // Number of data nodes of the quadrant within rings 1..r (clipped to the layer).
 std::uint32_t quadrantCount(const SearchIndex& index, std::int32_t j, std::int32_t k,
@@ -127,10 +133,142 @@ std::uint32_t quadrantCount(const SearchIndex& index, std::int32_t j, std::int32
   const std::int64_t kLo = std::max<std::int64_t>(std::min(k1, k2), 0);
   const std::int64_t kHi = std::min<std::int64_t>(std::max(k1, k2), index.nk - 1);
   if (jLo > jHi || kLo > kHi) return 0;
-  const std::int64_t w = std::int64_t{index.nj} + 1;
-  const std::uint32_t* c = index.counts;
-  return c[(kHi + 1) * w + jHi + 1] - c[kLo * w + jHi + 1] - c[(kHi + 1) * w + jLo] +
-         c[kLo * w + jLo];
+  return rectangleCount(index, jLo, jHi, kLo, kHi);
+}
+
+// First ring 1..rings of the quadrant that holds data, or 0 when none does.
+// The search starts at the hint (any value; clamped to 1..rings): a hint that
+// is right costs two counts, otherwise the answer is bracketed by galloping
+// away from it and then narrowed by halving.
+std::int64_t firstDataRing(const SearchIndex& index, std::int32_t j, std::int32_t k,
+                           const Quadrant& q, std::int64_t rings, std::int64_t hint) {
+  const std::int64_t start = std::clamp<std::int64_t>(hint, 1, rings);
+  std::int64_t empty = 0;  // rings 1..empty hold no data
+  std::int64_t full = 0;   // rings 1..full hold data
+  if (quadrantCount(index, j, k, q, start) != 0) {
+    full = start;
+    for (std::int64_t step = 1; full - step > 0; step *= 2) {
+      if (quadrantCount(index, j, k, q, full - step) == 0) {
+        empty = full - step;
+        break;
+      }
+      full -= step;
+    }
+  } else {
+    empty = start;
+    for (std::int64_t step = 1; full == 0; step *= 2) {
+      if (empty == rings) return 0;
+      const std::int64_t probe = std::min(rings, empty + step);
+      if (quadrantCount(index, j, k, q, probe) != 0) {
+        full = probe;
+      } else {
+        empty = probe;
+      }
+    }
+  }
+  while (full - empty > 1) {
+    const std::int64_t mid = empty + (full - empty) / 2;
+    if (quadrantCount(index, j, k, q, mid) == 0) {
+      empty = mid;
+    } else {
+      full = mid;
+    }
+  }
+  return full;
+}
+
+// Number of data nodes at sj + t*dj, sk + t*dk for t = tFirst .. tLast
+// (clipped to the layer).
+std::uint32_t legCount(const SearchIndex& index, std::int64_t sj, std::int64_t sk,
+                       std::int32_t dj, std::int32_t dk, std::int64_t tFirst, std::int64_t tLast) {
+  std::int64_t lo = tFirst;
+  std::int64_t hi = tLast;
+  clipAxis(sj, dj, index.nj, lo, hi);
+  clipAxis(sk, dk, index.nk, lo, hi);
+  if (lo > hi) return 0;
+  const std::int64_t ja = sj + lo * dj, jb = sj + hi * dj;
+  const std::int64_t ka = sk + lo * dk, kb = sk + hi * dk;
+  return rectangleCount(index, std::min(ja, jb), std::max(ja, jb), std::min(ka, kb),
+                        std::max(ka, kb));
+}
+
+// Legs shorter than this are scanned node by node; longer ones are halved
+// with leg counts.
+constexpr std::int64_t kScannedLegLength = 16;
+
+// As scanLeg, with long legs searched through the count table: the first t
+// holding data is found by halving.
+std::int64_t findOnLeg(const LayerView& layer, const SearchIndex& index, std::int64_t sj,
+                       std::int64_t sk, std::int32_t dj, std::int32_t dk, std::int64_t tFirst,
+                       std::int64_t tLast) {
+  std::int64_t lo = tFirst;
+  std::int64_t hi = tLast;
+  clipAxis(sj, dj, layer.nj, lo, hi);
+  clipAxis(sk, dk, layer.nk, lo, hi);
+  if (hi - lo < kScannedLegLength) return scanLeg(layer, sj, sk, dj, dk, lo, hi);
+  if (legCount(index, sj, sk, dj, dk, lo, hi) == 0) return -1;
+  while (lo < hi) {  // the first hit lies in lo..hi
+    const std::int64_t mid = lo + (hi - lo) / 2;
+    if (legCount(index, sj, sk, dj, dk, lo, mid) != 0) {
+      hi = mid;
+    } else {
+      lo = mid + 1;
+    }
+  }
+  return lo;
+}
+
+// As scanRing, with long legs searched through the count table.
+bool findOnRing(const LayerView& layer, const SearchIndex& index, std::int32_t j, std::int32_t k,
+                const Quadrant& q, std::int64_t r, std::int32_t& hj, std::int32_t& hk) {
+  // Leg A: node + r*u + t*v, t = 0 .. r-1.
+  std::int64_t sj = j + r * q.uj;
+  std::int64_t sk = k + r * q.uk;
+  std::int64_t t = findOnLeg(layer, index, sj, sk, q.vj, q.vk, 0, r - 1);
+  if (t >= 0) {
+    hj = static_cast<std::int32_t>(sj + t * q.vj);
+    hk = static_cast<std::int32_t>(sk + t * q.vk);
+    return true;
+  }
+  // Leg B: node + t*u + r*v, t = 1 .. r.
+  sj = j + r * q.vj;
+  sk = k + r * q.vk;
+  t = findOnLeg(layer, index, sj, sk, q.uj, q.uk, 1, r);
+  if (t >= 0) {
+    hj = static_cast<std::int32_t>(sj + t * q.uj);
+    hk = static_cast<std::int32_t>(sk + t * q.uk);
+    return true;
+  }
+  return false;
+}
+
+// Tells whether node (hj, hk), in practice the previous search's hit, is the
+// quadrant's first data node within rings 1..rings: it must hold data and lie
+// in the quadrant on some ring r <= rings, and neither rings 1..r-1 nor the
+// part of ring r scanned before it may hold data. If so, stores r in ring.
+bool confirmHit(const LayerView& layer, const SearchIndex& index, std::int32_t j,
+                std::int32_t k, const Quadrant& q, std::int64_t rings, std::int32_t hj,
+                std::int32_t hk, std::int64_t& ring) {
+  if (hj < 0 || hj >= layer.nj || hk < 0 || hk >= layer.nk) return false;
+  // The node's offset is a*u + b*v; it lies in the quadrant when a >= 1, b >= 0.
+  const std::int64_t dj = std::int64_t{hj} - j, dk = std::int64_t{hk} - k;
+  const std::int64_t a = dj * q.uj + dk * q.uk;
+  const std::int64_t b = dj * q.vj + dk * q.vk;
+  if (a < 1 || b < 0) return false;
+  const std::int64_t r = std::max(a, b);
+  if (r > rings || isEmptyCell(layer.data[hk * layer.nj + hj], layer.deleteValue)) return false;
+  if (r > 1 && quadrantCount(index, j, k, q, r - 1) != 0) return false;
+  // Leg A: node + r*u + t*v, t = 0 .. r-1 (the node is on it when b < r);
+  // leg B: node + t*u + r*v, t = 1 .. r.
+  const bool onLegA = b < r;
+  if (legCount(index, j + r * q.uj, k + r * q.uk, q.vj, q.vk, 0, onLegA ? b - 1 : r - 1) != 0) {
+    return false;
+  }
+  if (!onLegA && legCount(index, j + r * q.vj, k + r * q.vk, q.uj, q.uk, 1, a - 1) != 0) {
+    return false;
+  }
+  ring = r;
+  return true;
 }
 
 }  // namespace
@@ -159,47 +297,41 @@ std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, fl
 }
 
 std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
-                    double deleteValue, const SearchIndex& index, std::int32_t* jHit,
-                    std::int32_t* kHit) {
+                    double deleteValue, const SearchIndex& index, SearchHints& hints,
+                    std::int32_t* jHit, std::int32_t* kHit) {
   const LayerView view{layer.data, layer.nj, layer.nk, deleteValue};
   std::int32_t edges[4];
   edgeDistances(j, k, layer.nj, layer.nk, edges);
   std::int32_t count = 0;
   for (int quadrant = 0; quadrant < 4; ++quadrant) {
-    const Quadrant& q = kQuadrants[quadrant];
     const std::int64_t rings = ringLimit(edges[quadrant], reach);
-    std::int32_t hj = 0, hk = 0;
-    bool found = false;
-    const std::int64_t direct = std::min(rings, kDirectRings);
-    for (std::int64_t r = 1; r <= direct && !found; ++r) {
-      found = scanRing(view, j, k, q, r, hj, hk);
+    if (rings < 1) continue;
+    const Quadrant& q = kQuadrants[quadrant];
+    std::int32_t hj = hints.jHit[quadrant], hk = hints.kHit[quadrant];
+    std::int64_t ring = 0;
+    bool found = confirmHit(view, index, j, k, q, rings, hj, hk, ring);
+    if (!found) {
+      ring = firstDataRing(index, j, k, q, rings, hints.ring[quadrant]);
+      found = ring != 0 && findOnRing(view, index, j, k, q, ring, hj, hk);
     }
-    if (!found && rings > direct && quadrantCount(index, j, k, q, rings) != 0) {
-      // The first data ring lies in (direct, rings]: gallop outward, then halve.
-      std::int64_t empty = direct;  // rings 1..empty hold no data
-      std::int64_t full = std::min(rings, 2 * direct + 1);
-      while (quadrantCount(index, j, k, q, full) == 0) {
-        empty = full;
-        full = std::min(rings, 2 * full);
-      }
-      while (full - empty > 1) {
-        const std::int64_t mid = empty + (full - empty) / 2;
-        if (quadrantCount(index, j, k, q, mid) == 0) {
-          empty = mid;
-        } else {
-          full = mid;
-        }
-      }
-      // Ring `full` is the first with data, so its scan finds the hit.
-      found = scanRing(view, j, k, q, full, hj, hk);
-    }
+    // With no data in reach the limit is kept, so that the next call checks it first.
+    hints.ring[quadrant] = static_cast<std::int32_t>(found ? ring : rings);
     if (found) {
+      hints.jHit[quadrant] = hj;
+      hints.kHit[quadrant] = hk;
       ++count;
       jHit[count] = hj;
       kHit[count] = hk;
     }
   }
   return count;
+}
+
+std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
+                    double deleteValue, const SearchIndex& index, std::int32_t* jHit,
+                    std::int32_t* kHit) {
+  SearchHints hints;
+  return search(j, k, layer, reach, deleteValue, index, hints, jHit, kHit);
 }
 
 void searchIndexAlloc(SearchIndex& index, std::int32_t nj, std::int32_t nk) {

@@ -43,9 +43,26 @@ void searchIndexFree(SearchIndex& index);
 // Fills the table from layer (whose counts must equal the index's).
 void searchIndexBuild(SearchIndex& index, const FloatGrid2D& layer, double deleteValue);
 
+// What earlier searches over a layer found, per quadrant: the last hit and the
+// last first data ring (or the ring limit, when no data was in reach).
+// Neighbouring nodes mostly share their hits, so a search first checks the last
+// hit exactly against the count table, and failing that looks for the first
+// data ring outward or inward from the last one. Any content gives the same
+// hits, only the cost differs. The caller keeps one per walk over a layer.
+struct SearchHints {
+  std::int32_t jHit[4] = {-1, -1, -1, -1};
+  std::int32_t kHit[4] = {-1, -1, -1, -1};
+  std::int32_t ring[4] = {1, 1, 1, 1};
+};
+
 // The same search, with the hits found through the count table of the layer.
-// Gives exactly the hits of the plain search; it only reads fewer nodes when
-// the data lie far away.
+// Gives exactly the hits of the plain search, reading far fewer nodes when the
+// data lie far away. Starts from the hints and updates them.
+std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
+                    double deleteValue, const SearchIndex& index, SearchHints& hints,
+                    std::int32_t* jHit, std::int32_t* kHit);
+
+// The same with fresh hints, for a single search.
 std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
                     double deleteValue, const SearchIndex& index, std::int32_t* jHit,
                     std::int32_t* kHit);

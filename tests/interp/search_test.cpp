@@ -28,13 +28,16 @@ struct Layer {
   FloatGrid2D grid;
 };
 
-// Runs the plain search, or the table-assisted one when given the table;
-// entry 0 and the entries past the count must be left alone.
+// Runs the plain search, or the table-assisted one when given the table (with
+// the hints when given them); entry 0 and the entries past the count must be
+// left alone.
 Hits find(const Layer& layer, std::int32_t j, std::int32_t k, float reach,
-          const SearchIndex* index = nullptr) {
+          const SearchIndex* index = nullptr, SearchHints* hints = nullptr) {
   std::int32_t jHit[kHitListSize] = {-7, -7, -7, -7, -7}, kHit[kHitListSize] = {-7, -7, -7, -7, -7};
-  const std::int32_t n = index ? search(j, k, layer.grid, reach, kDelete, *index, jHit, kHit)
-                               : search(j, k, layer.grid, reach, kDelete, jHit, kHit);
+  const std::int32_t n =
+      !index  ? search(j, k, layer.grid, reach, kDelete, jHit, kHit)
+      : hints ? search(j, k, layer.grid, reach, kDelete, *index, *hints, jHit, kHit)
+              : search(j, k, layer.grid, reach, kDelete, *index, jHit, kHit);
   EXPECT_TRUE(n >= 0 && n <= 4) << n;
   Hits hits;
   for (int i = 0; i < kHitListSize; ++i) {
@@ -125,6 +128,9 @@ Hits ringWalk(const FloatGrid2D& g, std::int32_t j, std::int32_t k, float reach)
   return hits;
 }
 
+// The searches agree with the ring walk at every node of random layers: the
+// plain one, the table-assisted one from fresh hints, and the table-assisted
+// one keeping its hints over a walk in memory order and then in random order.
 TEST(Search, PlainAndTableSearchesAgreeWithTheRingWalkOnRandomLayers) {
   std::mt19937 random(20240611);
   const std::int32_t shapes[][2] = {{1, 1}, {1, 17}, {23, 1}, {9, 9}, {31, 12}, {40, 45}};
@@ -140,11 +146,18 @@ TEST(Search, PlainAndTableSearchesAgreeWithTheRingWalkOnRandomLayers) {
       SearchIndex index;
       searchIndexAlloc(index, shape[0], shape[1]);
       searchIndexBuild(index, layer.grid, kDelete);
+      std::vector<std::int32_t> order(static_cast<std::size_t>(2 * shape[0] * shape[1]));
+      for (std::size_t i = 0; i < order.size(); ++i)
+        order[i] = static_cast<std::int32_t>(i % (order.size() / 2));
+      std::shuffle(order.begin() + order.size() / 2, order.end(), random);
       for (float reach : reaches) {
-        for (std::int32_t node = 0; node < shape[0] * shape[1]; ++node) {
-          const std::int32_t j = node % shape[0], k = node / shape[0];
+        SearchHints hints;
+        for (std::size_t i = 0; i < order.size(); ++i) {
+          const std::int32_t j = order[i] % shape[0], k = order[i] / shape[0];
           const Hits expected = ringWalk(layer.grid, j, k, reach);
           SCOPED_TRACE(::testing::Message() << j << "," << k << " reach " << reach);
+          ASSERT_EQ(find(layer, j, k, reach, &index, &hints), expected);
+          if (i >= order.size() / 2) continue;
           ASSERT_EQ(find(layer, j, k, reach), expected);
           ASSERT_EQ(find(layer, j, k, reach, &index), expected);
           ++compared;
