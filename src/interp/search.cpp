@@ -77,14 +77,16 @@ std::int64_t scanLeg(const LayerView& layer, std::int64_t sj, std::int64_t sk, s
   return -1;
 }
 
-// Scans the quadrant's part of ring r, leg A before leg B. On a hit stores the
-// node in (hj, hk) and returns true.
-bool scanRing(const LayerView& layer, std::int32_t j, std::int32_t k, const Quadrant& q,
-              std::int64_t r, std::int32_t& hj, std::int32_t& hk) {
+// Walks the quadrant's part of ring r, leg A before leg B; findLeg(sj, sk, dj, dk,
+// tFirst, tLast) gives the first t of a leg whose node holds data, or -1. On a hit
+// stores the node in (hj, hk) and returns true.
+template <typename LegFinder>
+bool firstOnRing(std::int32_t j, std::int32_t k, const Quadrant& q, std::int64_t r,
+                 const LegFinder& findLeg, std::int32_t& hj, std::int32_t& hk) {
   // Leg A: node + r*u + t*v, t = 0 .. r-1.
   std::int64_t sj = j + r * q.uj;
   std::int64_t sk = k + r * q.uk;
-  std::int64_t t = scanLeg(layer, sj, sk, q.vj, q.vk, 0, r - 1);
+  std::int64_t t = findLeg(sj, sk, q.vj, q.vk, 0, r - 1);
   if (t >= 0) {
     hj = static_cast<std::int32_t>(sj + t * q.vj);
     hk = static_cast<std::int32_t>(sk + t * q.vk);
@@ -93,13 +95,25 @@ bool scanRing(const LayerView& layer, std::int32_t j, std::int32_t k, const Quad
   // Leg B: node + t*u + r*v, t = 1 .. r.
   sj = j + r * q.vj;
   sk = k + r * q.vk;
-  t = scanLeg(layer, sj, sk, q.uj, q.uk, 1, r);
+  t = findLeg(sj, sk, q.uj, q.uk, 1, r);
   if (t >= 0) {
     hj = static_cast<std::int32_t>(sj + t * q.uj);
     hk = static_cast<std::int32_t>(sk + t * q.uk);
     return true;
   }
   return false;
+}
+
+// Scans the quadrant's part of ring r node by node.
+bool scanRing(const LayerView& layer, std::int32_t j, std::int32_t k, const Quadrant& q,
+              std::int64_t r, std::int32_t& hj, std::int32_t& hk) {
+  return firstOnRing(
+      j, k, q, r,
+      [&layer](std::int64_t sj, std::int64_t sk, std::int32_t dj, std::int32_t dk,
+               std::int64_t tFirst, std::int64_t tLast) {
+        return scanLeg(layer, sj, sk, dj, dk, tFirst, tLast);
+      },
+      hj, hk);
 }
 
 // Farther of the two grid edges each quadrant faces, in quadrant order.
@@ -221,25 +235,13 @@ std::int64_t findOnLeg(const LayerView& layer, const SearchIndex& index, std::in
 // As scanRing, with long legs searched through the count table.
 bool findOnRing(const LayerView& layer, const SearchIndex& index, std::int32_t j, std::int32_t k,
                 const Quadrant& q, std::int64_t r, std::int32_t& hj, std::int32_t& hk) {
-  // Leg A: node + r*u + t*v, t = 0 .. r-1.
-  std::int64_t sj = j + r * q.uj;
-  std::int64_t sk = k + r * q.uk;
-  std::int64_t t = findOnLeg(layer, index, sj, sk, q.vj, q.vk, 0, r - 1);
-  if (t >= 0) {
-    hj = static_cast<std::int32_t>(sj + t * q.vj);
-    hk = static_cast<std::int32_t>(sk + t * q.vk);
-    return true;
-  }
-  // Leg B: node + t*u + r*v, t = 1 .. r.
-  sj = j + r * q.vj;
-  sk = k + r * q.vk;
-  t = findOnLeg(layer, index, sj, sk, q.uj, q.uk, 1, r);
-  if (t >= 0) {
-    hj = static_cast<std::int32_t>(sj + t * q.uj);
-    hk = static_cast<std::int32_t>(sk + t * q.uk);
-    return true;
-  }
-  return false;
+  return firstOnRing(
+      j, k, q, r,
+      [&layer, &index](std::int64_t sj, std::int64_t sk, std::int32_t dj, std::int32_t dk,
+                       std::int64_t tFirst, std::int64_t tLast) {
+        return findOnLeg(layer, index, sj, sk, dj, dk, tFirst, tLast);
+      },
+      hj, hk);
 }
 
 // Tells whether node (hj, hk), in practice the previous search's hit, is the

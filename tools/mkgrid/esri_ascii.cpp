@@ -16,15 +16,6 @@ namespace {
 // Most values of one grid: the engine counts grid elements in signed 32 bits.
 constexpr std::int64_t kMaxValues = 2147483647;
 
-bool parseNumber(const std::string& token, double* value) {
-  if (token.empty()) return false;
-  errno = 0;
-  char* end = nullptr;
-  const double v = std::strtod(token.c_str(), &end);
-  if (end != token.c_str() + token.size() || errno == ERANGE || !std::isfinite(v)) return false;
-  *value = v;
-  return true;
-}
 
 bool parseCount(const std::string& token, std::int32_t* value) {
   if (token.empty() || token.size() > 10) return false;
@@ -205,6 +196,16 @@ bool readEsriAsciiFile(const std::string& path, EsriGrid* grid, std::string* err
     if (error != nullptr) *error = path + ": " + *error;
     return false;
   }
+  return true;
+}
+
+bool parseNumber(const std::string& token, double* value) {
+  if (token.empty()) return false;
+  errno = 0;
+  char* end = nullptr;
+  const double v = std::strtod(token.c_str(), &end);
+  if (end != token.c_str() + token.size() || errno == ERANGE || !std::isfinite(v)) return false;
+  *value = v;
   return true;
 }
 

@@ -31,6 +31,9 @@ struct EsriGrid {
 bool parseEsriAscii(std::istream& in, EsriGrid* grid, std::string* error);
 bool readEsriAsciiFile(const std::string& path, EsriGrid* grid, std::string* error);
 
+// A whole token as a finite number; false for anything else (trailing text, overflow).
+bool parseNumber(const std::string& token, double* value);
+
 }  // namespace karnet::mkgrid
 
 #endif  // KARNET_TOOLS_MKGRID_ESRI_ASCII_H_

@@ -41,15 +41,8 @@ int usageError(const std::string& message) {
   return 1;
 }
 
-bool parseNumber(const std::string& text, double* value) {
-  if (text.empty()) return false;
-  errno = 0;
-  char* end = nullptr;
-  const double v = std::strtod(text.c_str(), &end);
-  if (end != text.c_str() + text.size() || errno == ERANGE || !std::isfinite(v)) return false;
-  *value = v;
-  return true;
-}
+
+using karnet::mkgrid::parseNumber;
 
 bool parsePair(const std::string& text, double* a, double* b) {
   const std::size_t comma = text.find(',');
