@@ -1,6 +1,4 @@
 #include <gtest/gtest.h>
-// GCC 12 warns wrongly (-Wrestrict) about std::string concatenation inlined in these tests.
-#pragma GCC diagnostic ignored "-Wrestrict"
 
 #include <algorithm>
 #include <cstdio>
