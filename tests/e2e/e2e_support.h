@@ -6,21 +6,11 @@
 #include <string>
 #include <vector>
 
+#include "common/temp_dir.h"
+
 namespace karnet::e2e {
 
-// A directory under the system's temporary directory, removed with everything in it.
-class TempDir {
- public:
-  TempDir();
-  ~TempDir();
-  TempDir(const TempDir&) = delete;
-  TempDir& operator=(const TempDir&) = delete;
-  const std::string& path() const { return path_; }
-  std::string file(const std::string& name) const { return path_ + "/" + name; }
-
- private:
-  std::string path_;
-};
+using TempDir = karnet::test::TempDir;
 
 struct ProcessResult {
   int exitCode = -1;    // exit status when the process exited

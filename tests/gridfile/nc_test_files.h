@@ -19,21 +19,13 @@
 #include <string>
 #include <vector>
 
-namespace karnet::test {
+#include "common/temp_dir.h"
 
-inline std::string makeScratchDir() {
-  std::string pattern = (std::filesystem::temp_directory_path() / "karnet-grd-XXXXXX").string();
-  if (mkdtemp(pattern.data()) == nullptr) throw std::runtime_error("mkdtemp");
-  return pattern;
-}
+namespace karnet::test {
 
 // Tests that each get a scratch directory, gone with the test, and a file name in it.
 class ScratchTest : public testing::Test {
  protected:
-  ~ScratchTest() override {
-    std::error_code ignored;
-    std::filesystem::remove_all(dir, ignored);
-  }
   std::string file(const std::string& name) const { return dir + "/" + name; }
   // Names of everything in the directory, hidden files included, sorted.
   std::vector<std::string> entries() const {
@@ -45,7 +37,8 @@ class ScratchTest : public testing::Test {
     return names;
   }
 
-  const std::string dir = makeScratchDir();
+  const TempDir scratch;
+  const std::string dir = scratch.path();
   const std::string path = file("test.nc");
 };
 

@@ -7,7 +7,7 @@
 #include <tuple>
 
 #include "control/log.h"
-#include "par_test_util.h"
+#include "common/temp_dir.h"
 #include "params/run_parameters.h"
 
 namespace karnet {

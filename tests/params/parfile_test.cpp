@@ -9,7 +9,7 @@
 #include <string>
 #include <vector>
 
-#include "par_test_util.h"
+#include "common/temp_dir.h"
 
 namespace karnet {
 namespace {
