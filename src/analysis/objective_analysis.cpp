@@ -4,24 +4,18 @@
 
 #include <algorithm>
 #include <cstdio>
-#include <cstring>
 
 #include "analysis/filters.h"
 #include "analysis/objan.h"
 #include "analysis/select_data.h"
 #include "control/log.h"
 #include "control/progress.h"
+#include "interp/node_tests.h"
 #include "interp/setadj.h"
 #include "support/float_grid.h"
 
 namespace karnet {
 namespace {
-
-inline bool holdsValue(float cell, double deleteValue) {
-  return static_cast<double>(cell) != deleteValue;
-}
-
-inline bool isDry(float bed, double landValue) { return static_cast<double>(bed) == landValue; }
 
 // Collects the cells of the layer that hold a value, x outer and y inner, into
 // the workspace's data arrays. Room was made for nData cells; a cell beyond
@@ -32,7 +26,7 @@ void collectDataCells(OaWorkspace& ws, const FloatGrid2D& grid, std::int32_t nDa
   for (std::int32_t j = 0; j < grid.nj; ++j) {
     for (std::int32_t k = 0; k < grid.nk; ++k) {
       const float value = grid.data[std::int64_t{k} * grid.nj + j];
-      if (!holdsValue(value, deleteValue)) continue;
+      if (isEmptyCell(value, deleteValue)) continue;
       if (collected > nData - 1) {
         std::printf("Uppsss... %i of %i \n", collected, nData);
         continue;
@@ -52,7 +46,7 @@ std::int32_t countDataCells(const FloatGrid2D& grid, double deleteValue) {
   const std::int64_t count = grid.elementCount();
   std::int32_t cells = 0;
   for (std::int64_t i = 0; i < count; ++i) {
-    if (holdsValue(grid.data[i], deleteValue)) ++cells;
+    if (!isEmptyCell(grid.data[i], deleteValue)) ++cells;
   }
   return cells;
 }
@@ -88,7 +82,7 @@ std::int32_t analyseLayer(OaWorkspace& ws, FloatGrid2D& grid, std::int32_t nData
         progressReportGrid(j - input.jOff, k - input.kOff, l - input.lOff);
       }
       const std::int64_t at = std::int64_t{k} * nj + j;
-      if (isDry(bathymetry.data[at], landValue)) continue;
+      if (isDryCell(bathymetry.data[at], landValue)) continue;
 
       const std::int32_t m = selectData(ws, j, k, settings);
       // The estimate replaces the cell only on success; the collected data
@@ -114,9 +108,9 @@ std::int32_t analyseLayer(OaWorkspace& ws, FloatGrid2D& grid, std::int32_t nData
   for (std::int32_t j = input.jOff; j <= jLast; ++j) {
     for (std::int32_t k = input.kOff; k <= kLast; ++k) {
       const std::int64_t at = std::int64_t{k} * nj + j;
-      if (isDry(bathymetry.data[at], landValue)) continue;
+      if (isDryCell(bathymetry.data[at], landValue)) continue;
       float& cell = grid.data[at];
-      if (!holdsValue(cell, deleteValue)) continue;
+      if (isEmptyCell(cell, deleteValue)) continue;
       if (cell > settings.MaxData) cell = settings.MaxData;
       if (settings.MinData > cell) cell = settings.MinData;
     }
@@ -145,8 +139,6 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
   const double deleteValue = state.deleteValue();
   const auto deleteCell = static_cast<float>(deleteValue);
   const std::int32_t nj = state.basicValues.nj;
-  const std::int64_t layerSize = state.basicValues.layerSize();
-  const std::size_t layerBytes = static_cast<std::size_t>(layerSize) * sizeof(float);
   const std::int32_t jLast = jOff + (settings.jx - settings.j0);
   const std::int32_t kLast = kOff + (settings.kx - settings.k0);
   const std::int32_t lLast = lOff + (settings.lx - settings.l0);
@@ -164,10 +156,8 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
   std::int64_t interpolations = 0;
   std::int64_t failures = 0;
   for (std::int32_t l = lOff; l <= lLast; ++l) {
-    float* basicValuesLayer = state.basicValues.data + state.basicValues.index(0, 0, l);
-    std::memcpy(state.layerBathymetry.data,
-                state.basicBathymetry.data + state.basicBathymetry.index(0, 0, l), layerBytes);
-    std::memcpy(state.layerValues.data, basicValuesLayer, layerBytes);
+    grid3DLayerGet(state.basicBathymetry, l, state.layerBathymetry);
+    grid3DLayerGet(state.basicValues, l, state.layerValues);
     grid2DCopyWindow(analysisGrid, state.layerValues);
 
     const std::int32_t nData = countDataCells(analysisGrid, deleteValue);
@@ -179,12 +169,12 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
     for (std::int32_t j = jOff; j <= jLast; ++j) {
       for (std::int32_t k = kOff; k <= kLast; ++k) {
         const std::int64_t at = std::int64_t{k} * nj + j;
-        state.layerValues.data[at] = isDry(state.layerBathymetry.data[at], state.landValue)
+        state.layerValues.data[at] = isDryCell(state.layerBathymetry.data[at], state.landValue)
                                          ? deleteCell
                                          : analysisGrid.data[at];
       }
     }
-    std::memcpy(basicValuesLayer, state.layerValues.data, layerBytes);
+    grid3DLayerPut(state.basicValues, l, state.layerValues);
   }
 
   logPrintf("\n");

@@ -129,10 +129,9 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
       continue;
     }
 
-    float* valuesLayer = values.data + lb * layerSize;
-    std::memcpy(layerBathymetry.data, bathymetry.data + lb * layerSize,
-                static_cast<std::size_t>(layerSize) * sizeof(float));
-    std::memcpy(layerValues.data, valuesLayer, static_cast<std::size_t>(layerSize) * sizeof(float));
+    const std::int32_t level = static_cast<std::int32_t>(lb);
+    grid3DLayerGet(bathymetry, level, layerBathymetry);
+    grid3DLayerGet(values, level, layerValues);
     std::memcpy(ws.scratch.data, layerValues.data,
                 static_cast<std::size_t>(layerSize) * sizeof(float));
     ws.indexCurrent = false;
@@ -166,7 +165,7 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
       smoothLayer(layerValues.data, layerValues.nj, layerValues.nk);
     }
 
-    std::memcpy(valuesLayer, layerValues.data, static_cast<std::size_t>(layerSize) * sizeof(float));
+    grid3DLayerPut(values, level, layerValues);
   }
 
   writeStatistics(counts);

@@ -68,6 +68,15 @@ void grid3DFill(FloatGrid3D& grid, float value) {
   std::fill(grid.data, grid.data + grid.total, value);
 }
 
+void grid3DLayerGet(const FloatGrid3D& grid, std::int32_t l, FloatGrid2D& layer) {
+  const float* from = grid.data + grid.index(grid.j0, grid.k0, l);
+  std::copy(from, from + grid.layerSize(), layer.data);
+}
+
+void grid3DLayerPut(FloatGrid3D& grid, std::int32_t l, const FloatGrid2D& layer) {
+  std::copy(layer.data, layer.data + grid.layerSize(), grid.data + grid.index(grid.j0, grid.k0, l));
+}
+
 void grid2DCopyWindow(FloatGrid2D& destination, const FloatGrid2D& source) {
   if (destination.data == nullptr || source.data == nullptr) return;
   // Only the part of the destination's window that the source covers is

@@ -63,6 +63,11 @@ void grid3DFree(FloatGrid3D& grid);
 // Every element of the grid becomes value.
 void grid3DFill(FloatGrid3D& grid, float value);
 
+// Copies horizontal layer l of a 3-D grid into a 2-D grid of the same x and y
+// counts, and back.
+void grid3DLayerGet(const FloatGrid3D& grid, std::int32_t l, FloatGrid2D& layer);
+void grid3DLayerPut(FloatGrid3D& grid, std::int32_t l, const FloatGrid2D& layer);
+
 // Copies the destination's window (its own origin and counts) out of the source.
 void grid2DCopyWindow(FloatGrid2D& destination, const FloatGrid2D& source);
 

@@ -117,6 +117,18 @@ TEST(Validation, ZeroNodeDistanceIsRefused) {
   EXPECT_EQ(after[0], "dx = 0.000000 dy = 0.000000");
 }
 
+// The small LOCAL case with its observation file rewritten line by line: edit(i, line)
+// gives the text that stands for line i (line ends included).
+void writeEditedCase(const TempDir& dir,
+                     const std::function<std::string(std::size_t, const std::string&)>& edit) {
+  ParameterFile p;
+  p.projection = "'LOCAL'";
+  const auto lines = splitLines(writeSmallCase(dir, p));
+  std::string text;
+  for (std::size_t i = 0; i < lines.size(); ++i) text += edit(i, lines[i]);
+  writeFile(dir.file("observations.txt"), text);
+}
+
 // The observation file is checked line by line while it is scanned.
 TEST(Validation, BadObservationLinesStopTheRunWithTheirLineNumber) {
   const std::vector<std::pair<std::string, std::string>> spoilers = {
@@ -129,16 +141,9 @@ TEST(Validation, BadObservationLinesStopTheRunWithTheirLineNumber) {
   for (const auto& [name, spoiler] : spoilers) {
     SCOPED_TRACE(name);
     TempDir dir;
-    ParameterFile p;
-    p.projection = "'LOCAL'";
-    const std::string obs = writeSmallCase(dir, p);
-    const auto lines = splitLines(obs);
-    std::string text;
-    for (std::size_t i = 0; i < lines.size(); ++i) {
-      if (i == 6) text += spoiler;
-      text += lines[i] + "\n";
-    }
-    writeFile(dir.file("observations.txt"), text);
+    writeEditedCase(dir, [&spoiler](std::size_t i, const std::string& line) {
+      return (i == 6 ? spoiler : std::string()) + line + "\n";
+    });
     const ProcessResult r = runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}});
     EXPECT_EQ(r.exitCode, 1);
     const std::string log = readFile(dir.file("case.log"));
@@ -151,18 +156,15 @@ TEST(Validation, BadObservationLinesStopTheRunWithTheirLineNumber) {
 
 TEST(Validation, LongLinesAndAMissingFinalLineFeedAreRead) {
   TempDir dir;
-  ParameterFile p;
-  p.projection = "'LOCAL'";
-  const std::string obs = writeSmallCase(dir, p);
-  const auto lines = splitLines(obs);
-  std::string text;
-  for (std::size_t i = 0; i < lines.size(); ++i) {
-    text += lines[i];
+  const std::size_t last = splitLines(writeSmallCase(dir, ParameterFile{})).size() - 1;
+  writeEditedCase(dir, [last](std::size_t i, const std::string& line) {
+    std::string text = line;
     // Trailing text is ignored, however long the line gets.
     if (i == 3) text.append(3, ' ').append(200, '#');
-    if (i + 1 < lines.size()) text += "\r\n";
-  }
-  writeFile(dir.file("observations.txt"), text);
+    // CR LF line ends, and none after the last line.
+    if (i < last) text += "\r\n";
+    return text;
+  });
   const ProcessResult r = runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}});
   const std::string log = readFile(dir.file("case.log"));
   EXPECT_EQ(r.exitCode, 0) << log;
