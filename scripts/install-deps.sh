@@ -9,6 +9,11 @@ packages=(
   libnetcdf-dev netcdf-bin
   libproj-dev proj-data
   python3 python3-numpy python3-netcdf4 python3-xarray
+  libgdal-dev gdal-bin python3-gdal cdo
+  python3-matplotlib
+  libbenchmark-dev
+  clang libclang-rt-14-dev
+  openmpi-bin libopenmpi-dev
 )
 
 missing=()
