@@ -50,6 +50,7 @@ std::string listColumns(const std::vector<std::string>& header) {
 struct Columns {
   int lon = -1, lat = -1, vertical = -1, value = -1, time = -1, qc = -1;
   bool isPressure = false;
+  std::vector<int> valueCandidates;  // when no column is named for the values
 };
 
 class ColumnFinder {
@@ -142,13 +143,18 @@ Columns findColumns(const std::vector<std::string>& header, const std::string& n
       }
       others.push_back(i);
     }
-    if (others.size() != 1) {
-      throw ObsError(name + ": which column holds the values? Name it with --value (columns: " +
-                     listColumns(header) + ")");
+    if (others.size() == 1) {
+      c.value = others[0];
+    } else {
+      c.valueCandidates = others;  // decided by the first row: the one numeric column
     }
-    c.value = others[0];
   }
   return c;
+}
+
+[[noreturn]] void whichValueColumn(const std::vector<std::string>& header, const std::string& name) {
+  throw ObsError(name + ": which column holds the values? Name it with --value (columns: " +
+                 listColumns(header) + ")");
 }
 
 enum class Parsed { Number, Missing, Bad };
@@ -254,11 +260,27 @@ void readTable(std::istream& in, const std::string& name, const ReadOptions& opt
       delimiter = detectDelimiter(line);
       header = splitFields(line, delimiter);
       columns = findColumns(header, name, options);
+      if (columns.value < 0 && columns.valueCandidates.empty()) whichValueColumn(header, name);
       needed = 1 + std::max({columns.lon, columns.lat, columns.vertical, columns.value,
                              options.needTime ? columns.time : -1, columns.qc});
       continue;
     }
     const std::vector<std::string> fields = splitFields(line, delimiter);
+    if (columns.value < 0) {
+      // Several columns could hold the values: the only one with a number in the first row
+      // (a station name or cruise id has none).
+      std::vector<int> numeric;
+      for (int column : columns.valueCandidates) {
+        double v = 0.0;
+        if (column < static_cast<int>(fields.size()) &&
+            parseNumber(fields[column], delimiter, options, &v) != Parsed::Bad) {
+          numeric.push_back(column);
+        }
+      }
+      if (numeric.size() != 1) whichValueColumn(header, name);
+      columns.value = numeric[0];
+      needed = std::max(needed, columns.value + 1);
+    }
     const Where where = [&name, lineNumber] { return name + ":" + std::to_string(lineNumber); };
     Row row;
     row.isPressure = columns.isPressure;
