@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <csignal>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
@@ -13,6 +14,37 @@
 #include "obs/observation.h"
 
 namespace karnet::obs {
+
+namespace {
+
+// The temporary file being written, removed when a signal stops the program meanwhile.
+char pendingFile[4096];
+volatile std::sig_atomic_t pending = 0;
+constexpr int kStopSignals[] = {SIGINT, SIGTERM, SIGHUP};
+
+extern "C" void removePendingAndStop(int signalNumber) {
+  if (pending != 0) ::unlink(pendingFile);
+  std::signal(signalNumber, SIG_DFL);
+  std::raise(signalNumber);
+}
+
+// Removes the temporary file on a stop signal while it exists.
+class PendingFile {
+ public:
+  explicit PendingFile(const std::string& path) {
+    std::snprintf(pendingFile, sizeof pendingFile, "%s", path.c_str());
+    pending = path.size() < sizeof pendingFile ? 1 : 0;
+    for (int s : kStopSignals) std::signal(s, removePendingAndStop);
+  }
+  ~PendingFile() {
+    for (int s : kStopSignals) std::signal(s, SIG_DFL);
+    pending = 0;
+  }
+  PendingFile(const PendingFile&) = delete;
+  PendingFile& operator=(const PendingFile&) = delete;
+};
+
+}  // namespace
 
 std::string bathymetryProjection(const std::string& path) {
   grdInitSystem();
@@ -36,6 +68,7 @@ void writeFileAtomically(const std::string& path, const std::string& text) {
   std::string temporary = path + ".tmpXXXXXX";
   const int fd = mkstemp(temporary.data());
   if (fd < 0) throw ObsError(path + ": cannot create: " + std::strerror(errno));
+  const PendingFile guard(temporary);
   // mkstemp makes the file private; a result file gets the usual permissions.
   const mode_t mask = umask(0);
   umask(mask);

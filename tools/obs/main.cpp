@@ -241,11 +241,12 @@ int main(int argc, char** argv) {
     } catch (const std::exception& e) {
       throw ObsError("projection '" + projection + "' not usable: " + e.what());
     }
-    if (filters.box && !converter->local()) {
+    if (filters.box) {
       const auto& b = *filters.box;
-      if (b[1] > b[3] || std::fabs(b[1]) > 90.0 || std::fabs(b[3]) > 90.0) {
+      if (b[1] > b[3] || (!converter->local() && (std::fabs(b[1]) > 90.0 || std::fabs(b[3]) > 90.0))) {
         return usageError("--box latitudes must run from south to north within -90 to 90");
       }
+      if (converter->local() && b[0] > b[2]) return usageError("--box needs x0 <= x1 with LOCAL");
     }
     const RowSink sink = [&converter](const Row& row, const Where& where) {
       converter->add(row, where);
