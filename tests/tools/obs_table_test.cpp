@@ -119,6 +119,7 @@ TEST(ObsTable, FaultsAreNamed) {
       {"lon,lat,depth,temp,psal\n1,2,3,4,5\n", "which column holds the values?"},
       {"lon,lat,depth,value,Value\n1,2,3,4,5\n", "two columns are named 'Value'"},
       {"# only a comment\n", "no header line"},
+      {std::string("\x1f\x8b\x08\0lon,lat\n", 12), "t.csv:1: not a text table"},
   };
   for (const auto& [text, expected] : cases) {
     const std::string error = errorOf(text);

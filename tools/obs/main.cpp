@@ -5,6 +5,7 @@
 #include <cmath>
 #include <cstdio>
 #include <cstring>
+#include <filesystem>
 #include <fstream>
 #include <iostream>
 #include <memory>
@@ -259,6 +260,8 @@ int main(int argc, char** argv) {
         readTable(std::cin, "(standard input)", read, sink);
         continue;
       }
+      std::error_code ignored;
+      if (std::filesystem::is_directory(input, ignored)) throw ObsError(input + ": is a directory");
       std::ifstream in(input, std::ios::binary);
       if (!in) throw ObsError(input + ": cannot open: " + std::strerror(errno));
       if (looksLikeNetcdf(input)) {

@@ -257,6 +257,12 @@ void readTable(std::istream& in, const std::string& name, const ReadOptions& opt
     const std::string content = trim(line);
     if (content.empty() || content[0] == '#') continue;
     if (header.empty()) {
+      for (char c : line) {
+        if ((static_cast<unsigned char>(c) < 0x20 && c != '\t' && c != '\r') || c == '\x7f') {
+          throw ObsError(name + ":" + std::to_string(lineNumber) +
+                         ": not a text table (control characters) nor a NetCDF file");
+        }
+      }
       delimiter = detectDelimiter(line);
       header = splitFields(line, delimiter);
       columns = findColumns(header, name, options);
