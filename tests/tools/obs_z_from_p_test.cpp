@@ -54,10 +54,15 @@ TEST(ObsIsoTime, DatesAndTimes) {
   EXPECT_FALSE(dateOnly);
   ASSERT_TRUE(parseIsoTime(" 2000-03-01 06:00:00.5 ", &days));
   EXPECT_DOUBLE_EQ(days, 18322.0 + (6 * 3600 + 0.5) / 86400.0);  // 2000 is a leap year
+  ASSERT_TRUE(parseIsoTime("1950-01-02T01:30+03:00", &days));  // 22:30 UTC the day before
+  EXPECT_DOUBLE_EQ(days, 22.5 / 24.0);
+  ASSERT_TRUE(parseIsoTime("1950-01-01T20:00-0400", &days));
+  EXPECT_DOUBLE_EQ(days, 1.0);
   EXPECT_EQ(daysSince1950(1949, 12, 31), -1);
   EXPECT_EQ(daysSince1950(2100, 3, 1) - daysSince1950(2100, 2, 28), 1);  // 2100 is not
   for (const char* bad : {"2007-02-29", "2007-13-01", "2007-1-01", "07-01-01", "2007-01-01T25:00",
-                          "2007-01-01x", "2007/01/01", "", "2007-01-01T10"}) {
+                          "2007-01-01x", "2007/01/01", "", "2007-01-01T10",
+                          "2007-01-01+02:00", "2007-01-01T10:00+2"}) {
     EXPECT_FALSE(parseIsoTime(bad, &days)) << bad;
   }
   ASSERT_TRUE(parseDaysSinceUnit("days since 1950-01-01 00:00:00 UTC", &days));

@@ -94,9 +94,20 @@ bool parseIsoTime(std::string_view text, double* days, bool* dateOnly) {
     if (hour > 23 || minute > 59 || second > 59) return false;
     seconds = hour * 3600.0 + minute * 60.0 + second + fraction;
   }
-  const std::string_view zone = text.substr(at);
-  if (!(zone.empty() || zone == "Z" || zone == "+00:00" || zone == "+0000" ||
-        (hasTime && (zone == " UTC" || zone == "UTC")))) {
+  std::string_view zone = text.substr(at);
+  if (hasTime && !zone.empty() && (zone[0] == '+' || zone[0] == '-')) {
+    // A UTC offset, +HH:MM or +HHMM: local time minus the offset is UTC.
+    std::size_t z = 1;
+    int hours = 0, minutes = 0;
+    if (!digits(zone, &z, 2, &hours)) return false;
+    if (z < zone.size() && zone[z] == ':') ++z;
+    if (!digits(zone, &z, 2, &minutes) || z != zone.size() || hours > 23 || minutes > 59) {
+      return false;
+    }
+    seconds -= (zone[0] == '+' ? 1 : -1) * (hours * 3600.0 + minutes * 60.0);
+    zone = {};
+  }
+  if (!(zone.empty() || zone == "Z" || (hasTime && (zone == " UTC" || zone == "UTC")))) {
     return false;
   }
   *days = static_cast<double>(daysSince1950(year, month, day)) + seconds / 86400.0;

@@ -9,7 +9,8 @@ namespace karnet::obs {
 long long daysSince1950(int year, int month, int day);
 
 // Reads an ISO 8601 date or date and time in UTC: "2007-05-12", "2007-05-12T10:30",
-// "2007-05-12 10:30:15.5", with an optional "Z" or "+00:00" at the end. Gives the time as days
+// "2007-05-12 10:30:15.5", with an optional "Z", "UTC" or offset from UTC ("+02:00", "-0330")
+// after a time. Gives the time as days
 // since 1950-01-01 00:00 UTC, and whether only a date was given. False for anything else,
 // impossible dates and times included.
 bool parseIsoTime(std::string_view text, double* days, bool* dateOnly = nullptr);
