@@ -193,6 +193,11 @@ TEST(ObsProgram, BadInputStopsWithoutOutput) {
     EXPECT_NE(r.err.find(expected), std::string::npos) << "expected: " << expected << "\n" << r.err;
     EXPECT_EQ(readFile(dir.file("obs.txt")), "earlier result\n") << expected;
   }
+  // The result never replaces an input.
+  const ProcessResult same = runObs({"-p", "UTM-32", "good.csv", "-o", "./good.csv"}, dir);
+  EXPECT_EQ(same.exitCode, 1);
+  EXPECT_NE(same.err.find("the output ./good.csv is also an input"), std::string::npos) << same.err;
+  EXPECT_EQ(readFile(dir.file("good.csv")), "lon,lat,depth,value\n10,55,5,1\n");
   // No temporary file is left behind.
   for (const std::string& name : listDir(dir.path())) {
     EXPECT_EQ(name.find(".tmp"), std::string::npos) << name;

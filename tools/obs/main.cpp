@@ -234,6 +234,17 @@ int main(int argc, char** argv) {
     return usageError("--to lies before --from");
   }
   read.needTime = filters.from.has_value() || filters.to.has_value();
+  if (!output.empty()) {
+    // Renaming the result over an input would destroy it.
+    std::error_code ignored;
+    std::vector<std::string> sources = inputs;
+    if (!bathymetry.empty()) sources.push_back(bathymetry);
+    for (const std::string& source : sources) {
+      if (source != "-" && std::filesystem::equivalent(source, output, ignored)) {
+        return usageError("the output " + output + " is also an input");
+      }
+    }
+  }
 
   try {
     if (!bathymetry.empty()) projection = bathymetryProjection(bathymetry);
