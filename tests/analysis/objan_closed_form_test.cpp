@@ -37,7 +37,7 @@ void expectClose(double actual, double expected, const char* what) {
   EXPECT_NEAR(actual, expected, 1e-5 * std::fabs(expected) + 1e-6) << what;
 }
 
-TEST(ClosedForm, CorrelationAtNodeDistances) {
+TEST(ObjanClosedForm, CorrelationAtNodeDistances) {
   const RunSettings s = settings250(4, 0);
   ScopedWorkspace w(0, 30, 30, s);
   // Near, at the zero crossing, beyond it (negative), at and just beyond the
@@ -52,7 +52,7 @@ TEST(ClosedForm, CorrelationAtNodeDistances) {
   EXPECT_EQ(correlation(320.5f, w.ws), 0.0f);
 }
 
-TEST(ClosedForm, RemoveWeightedMeanDividesByTheSumOfAllEntries) {
+TEST(ObjanClosedForm, RemoveWeightedMeanDividesByTheSumOfAllEntries) {
   // An arbitrary 3 x 3 block in a stride-4 matrix: mean = sum_ij a_ij v_j / sum_ij a_ij.
   const RunSettings s = settings250(4, 0);
   ScopedWorkspace w(0, 1, 1, s);
@@ -76,7 +76,7 @@ TEST(ClosedForm, RemoveWeightedMeanDividesByTheSumOfAllEntries) {
   for (int i = 0; i < 3; ++i) expectClose(values[i], v[i] - weighted / total, "value");
 }
 
-TEST(ClosedForm, CorrelationMatrixIsInvertedWithTheErrorTermOnItsDiagonal) {
+TEST(ObjanClosedForm, CorrelationMatrixIsInvertedWithTheErrorTermOnItsDiagonal) {
   // Cells at (0, 0), (1, 2), (4, 0): the inverse times the matrix built in
   // double precision is the identity.
   const double x[3] = {0, 1, 4}, y[3] = {0, 2, 0};
@@ -102,7 +102,7 @@ TEST(ClosedForm, CorrelationMatrixIsInvertedWithTheErrorTermOnItsDiagonal) {
   }
 }
 
-TEST(ClosedForm, ObjanEstimateOfTwoAndThreeCells) {
+TEST(ObjanClosedForm, EstimateFromTwoToSixCells) {
   using Cells = std::vector<reference::Cell>;
   const struct {
     const char* what;
@@ -117,6 +117,7 @@ TEST(ClosedForm, ObjanEstimateOfTwoAndThreeCells) {
       {"three cells, large error term", {{0, 0, 5}, {2, 1, 9}, {3, 3, 12}}, 1, 2, 60},
       // The node lies beyond the cut-off of the first cell (r2 = 333).
       {"three cells, one beyond the cut-off", {{0, 0, 20}, {15, 10, 7}, {17, 12, 11}}, 18, 3, 10},
+      {"six cells", {{0, 0, 1}, {1, 3, 4}, {2, 1, -2}, {4, 4, 8}, {5, 0, 3}, {6, 2, 5}}, 3, 2, 10},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.what);

@@ -29,7 +29,7 @@ void expectClose(double actual, double expected, const char* what) {
   EXPECT_NEAR(actual, expected, 1e-5 * std::fabs(expected) + 1e-5) << what;
 }
 
-// Four hits around node (0, 0), quadrants Q1..Q4, as offsets.
+// Four hits, quadrants Q1..Q4, as offsets from the node.
 using Hits = std::array<std::array<int, 2>, 4>;
 
 float bilinAtOrigin(const Hits& hits, const double (&f)[4]) {
@@ -50,10 +50,14 @@ double bilinReference(const Hits& p, const double (&f)[4]) {
   auto cut = [](double a0, double a1, double t0, double t1, double t) {
     return a0 + (a1 - a0) * (t - t0) / (t1 - t0);
   };
-  const double kA = cut(p[0][1], p[1][1], p[0][0], p[1][0], 0), fA = cut(f[0], f[1], p[0][0], p[1][0], 0);
-  const double kC = cut(p[2][1], p[3][1], p[2][0], p[3][0], 0), fC = cut(f[2], f[3], p[2][0], p[3][0], 0);
-  const double jB = cut(p[1][0], p[2][0], p[1][1], p[2][1], 0), fB = cut(f[1], f[2], p[1][1], p[2][1], 0);
-  const double jD = cut(p[3][0], p[0][0], p[3][1], p[0][1], 0), fD = cut(f[3], f[0], p[3][1], p[0][1], 0);
+  const double kA = cut(p[0][1], p[1][1], p[0][0], p[1][0], 0);
+  const double fA = cut(f[0], f[1], p[0][0], p[1][0], 0);
+  const double kC = cut(p[2][1], p[3][1], p[2][0], p[3][0], 0);
+  const double fC = cut(f[2], f[3], p[2][0], p[3][0], 0);
+  const double jB = cut(p[1][0], p[2][0], p[1][1], p[2][1], 0);
+  const double fB = cut(f[1], f[2], p[1][1], p[2][1], 0);
+  const double jD = cut(p[3][0], p[0][0], p[3][1], p[0][1], 0);
+  const double fD = cut(f[3], f[0], p[3][1], p[0][1], 0);
   return 0.5 * (cut(fA, fC, kA, kC, 0) + cut(fB, fD, jB, jD, 0));
 }
 
