@@ -124,7 +124,8 @@ std::int64_t readObservations(RunState& state, const char* fileName, const Rotat
     if (stored % 1000 == 0) progressCheckCancel();
     double v[4];
     if (!parseObservation(line.c_str(), v)) {
-      waterFileError(state, fileName, lineNumber, observationLineProblem(line.c_str()));
+      const std::string problem = observationLineProblem(line.c_str());
+      waterFileError(state, fileName, lineNumber, problem.empty() ? "cannot be read" : problem);
     }
     // The arrays were sized from the line count; a file that grew since then
     // must not write past them.
