@@ -302,5 +302,29 @@ TEST(ResultTools, TurnedResultIsPlacedThroughItsGeolocationArrays) {
   EXPECT_NEAR(north, *std::max_element(lat.begin(), lat.end()), 0.01);
 }
 
+// Observations in zone 32 run as zone 33 lie hundreds of kilometres away from the grid:
+// the run completes, but says so.
+TEST(ResultTools, WrongZoneRunWarnsToCheckTheProjection) {
+  TempDir dir;
+  writeUtmCase(dir, 0.0, "'UTM-33'");
+  const ProcessResult wrong = runKarnet({"case.pfs"}, dir.path(), kBatch);
+  EXPECT_EQ(wrong.exitCode, 0);
+  EXPECT_NE(wrong.err.find("karnet: warning: only 0 of 1840 observations lie inside the grid: "
+                           "check the projection\n"),
+            std::string::npos)
+      << wrong.err;
+  EXPECT_NE(wrong.err.find("1840 outside the grid"), std::string::npos) << wrong.err;
+  // Quiet runs are still warned.
+  const ProcessResult quiet = runKarnet({"--quiet", "case.pfs"}, dir.path(), kBatch);
+  EXPECT_NE(quiet.err.find("check the projection"), std::string::npos) << quiet.err;
+
+  writeUtmCase(dir, 0.0);
+  const ProcessResult right = runKarnet({"case.pfs"}, dir.path(), kBatch);
+  EXPECT_EQ(right.exitCode, 0);
+  EXPECT_EQ(right.err.find("warning"), std::string::npos) << right.err;
+  // Casts at 10 x 8 nodes (every fourth, clear of the land column), 23 levels each.
+  EXPECT_NE(right.err.find("1840 read, 1840 used"), std::string::npos) << right.err;
+}
+
 }  // namespace
 }  // namespace karnet::e2e
