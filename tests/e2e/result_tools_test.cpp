@@ -326,5 +326,23 @@ TEST(ResultTools, WrongZoneRunWarnsToCheckTheProjection) {
   EXPECT_NE(right.err.find("1840 read, 1840 used"), std::string::npos) << right.err;
 }
 
+// The result records when and how it was made; with SOURCE_DATE_EPOCH two runs give the
+// same bytes, lon and lat included.
+TEST(ResultTools, RepeatedRunsGiveTheSameBytes) {
+  TempDir dir;
+  writeUtmCase(dir, 25.0);
+  std::map<std::string, std::string> env = kBatch;
+  env["SOURCE_DATE_EPOCH"] = "1700000000";
+  ASSERT_EQ(runKarnet({"--quiet", "case.pfs"}, dir.path(), env).exitCode, 0);
+  const std::string first = readFile(dir.file("result.nc"));
+  ASSERT_EQ(runKarnet({"--quiet", "case.pfs"}, dir.path(), env).exitCode, 0);
+  EXPECT_TRUE(first == readFile(dir.file("result.nc")));
+  const ProcessResult header = runProgram("/usr/bin/ncdump", {"-h", "result.nc"}, dir.path());
+  EXPECT_NE(header.out.find(":history = \"2023-11-14T22:13:20Z: " KARNET_BINARY
+                            " --quiet case.pfs\" ;"),
+            std::string::npos)
+      << header.out;
+}
+
 }  // namespace
 }  // namespace karnet::e2e
