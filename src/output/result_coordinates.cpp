@@ -4,6 +4,7 @@
 #include "output/result_coordinates.h"
 
 #include <cmath>
+#include <limits>
 #include <memory>
 #include <vector>
 
@@ -24,7 +25,9 @@ bool makeFrame(const FileDescription& d, const Cartography& map, bool local, Res
   // convergence at (the description holds the inverse of the projected origin).
   const double gamma = map.convergence(longitude, latitude);
   if (!std::isfinite(gamma)) return false;
-  f->turned = !(std::fabs(orientation - gamma) <= kParallelGridTolerance);
+  const double tolerance =
+      kParallelGridTolerance + std::fabs(orientation) * std::numeric_limits<float>::epsilon();
+  f->turned = !(std::fabs(orientation - gamma) <= tolerance);
   if (f->turned) {
     const double theta = (orientation - gamma) * (-3.141592654) / 180;
     f->co = std::cos(theta);

@@ -11,7 +11,8 @@ struct FileDescription;
 
 // The largest difference, in degrees, between the orientation and the
 // meridian convergence at the origin for which the grid counts as parallel to
-// the projection's axes.
+// the projection's axes; the bathymetry's custom block holds the orientation
+// in single precision, so one float rounding of it is allowed on top.
 inline constexpr double kParallelGridTolerance = 1e-6;
 
 // Where a result grid lies: its origin node in projected coordinates and the

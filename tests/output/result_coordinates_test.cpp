@@ -5,6 +5,7 @@
 
 #include <cmath>
 #include <numbers>
+#include <utility>
 #include <vector>
 
 #include "output/result_coordinates.h"
@@ -152,6 +153,33 @@ TEST(ResultCoordinates, PlainMetresHaveNoLongitudes) {
   }
   GrdGeoreference g;
   EXPECT_FALSE(resultGeoreference(*Description(0.0).d, "UTM-99", &g));
+}
+
+// A polar stereographic grid far from its central meridian has a large convergence, which
+// the bathymetry keeps in single precision: still parallel. A turn of 1e-4 degrees is not.
+TEST(ResultCoordinates, ParallelWithinTheOrientationsPrecision) {
+  PJ_CONTEXT* context = proj_context_create();
+  PJ* polar = proj_create(context, "+proj=stere +lat_0=90 +lat_ts=70 +lon_0=-45 +datum=WGS84");
+  const double gamma =
+      proj_factors(polar, proj_coord(120.37 * kDeg, 75.0 * kDeg, 0, 0)).meridian_convergence /
+      kDeg;
+  proj_destroy(polar);
+  proj_context_destroy(context);
+  ASSERT_GT(std::fabs(gamma), 100.0);
+  // The case is one where the float rounding alone exceeds the plain tolerance.
+  ASSERT_GT(std::fabs(static_cast<float>(gamma) - gamma), kParallelGridTolerance);
+  for (const auto& [orientation, turned] :
+       {std::pair{static_cast<double>(static_cast<float>(gamma)), false},
+        std::pair{gamma + 1e-4, true}}) {
+    Description desc(orientation);
+    desc.d->axes[1].origin = 120.37;
+    desc.d->axes[2].origin = 75.0;
+    GrdGeoreference g;
+    ResultFrame frame;
+    ASSERT_TRUE(resultGeoreference(*desc.d, "EPSG:3413", &g, &frame));
+    EXPECT_EQ(frame.turned, turned) << orientation - gamma;
+    EXPECT_EQ(g.projectedXY, !turned);
+  }
 }
 
 }  // namespace
