@@ -9,12 +9,13 @@
 #include <numbers>
 #include <sstream>
 
+#include "common/utm32_reference.h"
 #include "e2e/e2e_support.h"
 
 namespace karnet::e2e {
 namespace {
 
-constexpr double kDeg = std::numbers::pi / 180.0;
+constexpr double kDeg = test::kDegree;
 constexpr double kLon0 = 11.3, kLat0 = 55.2;
 constexpr int kNx = 40, kNy = 30;
 constexpr double kCell = 250.0;
@@ -27,36 +28,7 @@ bool havePythonModule(const char* module) {
              0;
 }
 
-// WGS 84 / UTM zone 32N through PROJ's API, independent of karnet's cartography.
-class Utm32 {
- public:
-  Utm32() : context_(proj_context_create()) {
-    PJ* op = proj_create_crs_to_crs(context_, "EPSG:4326", "EPSG:32632", nullptr);
-    toUtm_ = proj_normalize_for_visualization(context_, op);
-    proj_destroy(op);
-    plain_ = proj_create(context_, "+proj=utm +zone=32 +datum=WGS84");
-  }
-  ~Utm32() {
-    proj_destroy(plain_);
-    proj_destroy(toUtm_);
-    proj_context_destroy(context_);
-  }
-  PJ_XY forward(double lon, double lat) const {
-    return proj_trans(toUtm_, PJ_FWD, proj_coord(lon, lat, 0, 0)).xy;
-  }
-  PJ_XY inverse(double x, double y) const {
-    return proj_trans(toUtm_, PJ_INV, proj_coord(x, y, 0, 0)).xy;
-  }
-  double convergence(double lon, double lat) const {
-    return proj_factors(plain_, proj_coord(lon * kDeg, lat * kDeg, 0, 0)).meridian_convergence /
-           kDeg;
-  }
-
- private:
-  PJ_CONTEXT* context_;
-  PJ* toUtm_ = nullptr;
-  PJ* plain_ = nullptr;
-};
+using test::Utm32;
 
 // Temperature that falls with depth only: 20 degrees at the surface, 10 at 500 m.
 double temperature(double depth) { return 20.0 - depth / 50.0; }

@@ -8,44 +8,16 @@
 #include <utility>
 #include <vector>
 
+#include "common/utm32_reference.h"
 #include "output/result_coordinates.h"
 #include "support/file_description.h"
 
 namespace karnet {
 namespace {
 
-constexpr double kDeg = std::numbers::pi / 180.0;
+constexpr double kDeg = test::kDegree;
 
-// WGS 84 / UTM zone 32N through PROJ's own API: the reference the writer is held to.
-class Utm32 {
- public:
-  Utm32() : context_(proj_context_create()) {
-    PJ* op = proj_create_crs_to_crs(context_, "EPSG:4326", "EPSG:32632", nullptr);
-    toUtm_ = proj_normalize_for_visualization(context_, op);
-    proj_destroy(op);
-    plain_ = proj_create(context_, "+proj=utm +zone=32 +datum=WGS84");
-  }
-  ~Utm32() {
-    proj_destroy(plain_);
-    proj_destroy(toUtm_);
-    proj_context_destroy(context_);
-  }
-  PJ_XY forward(double lon, double lat) const {
-    return proj_trans(toUtm_, PJ_FWD, proj_coord(lon, lat, 0, 0)).xy;
-  }
-  PJ_XY inverse(double x, double y) const {
-    return proj_trans(toUtm_, PJ_INV, proj_coord(x, y, 0, 0)).xy;
-  }
-  double convergence(double lon, double lat) const {
-    return proj_factors(plain_, proj_coord(lon * kDeg, lat * kDeg, 0, 0)).meridian_convergence /
-           kDeg;
-  }
-
- private:
-  PJ_CONTEXT* context_;
-  PJ* toUtm_ = nullptr;
-  PJ* plain_ = nullptr;
-};
+using test::Utm32;
 
 // A 7 x 5 x 4 result grid of 200 x 300 m cells and 5 m levels at (11.3 E, 55.2 N).
 struct Description {
