@@ -1,4 +1,4 @@
-// karnet-mkgrid: reading .asc grids, building the bathymetry, and the program.
+// karnet-mkgrid on ESRI ASCII grids: the strict reader and the grids made from them as they are.
 #include <gtest/gtest.h>
 
 #include <sstream>
@@ -6,20 +6,19 @@
 #include <utility>
 #include <vector>
 
-#include "gridfile/nc_test_files.h"
 #include "input/bathymetry_read.h"
+#include "tools/mkgrid_test_support.h"
 #include "input/cartography.h"
 #include "mkgrid/esri_ascii.h"
-#include "mkgrid/grid_builder.h"
 #include "support/file_description.h"
 #include "support/float_grid.h"
 
 namespace karnet {
 namespace {
 
-using mkgrid::BuildOptions;
 using mkgrid::EsriGrid;
-using mkgrid::OriginSource;
+using test::quoted;
+using test::runMkgrid;
 
 // Four columns, three rows, the north row first; one NODATA cell.
 constexpr const char* kSmallGrid =
@@ -70,57 +69,7 @@ TEST(MkgridAscii, FaultsAreNamed) {
   }
 }
 
-// Row order, land and the LOCAL origin by default are in the program's test.
-TEST(MkgridBuild, NegatedValuesOrientationAndGivenOrigin) {
-  EsriGrid grid;
-  std::string error;
-  ASSERT_TRUE(parse(kSmallGrid, &grid, &error));
-  BuildOptions options;
-  options.landValue = 2.5;
-  options.negate = true;
-  options.hasOrientation = true;
-  options.orientation = 30.0;
-  options.origin = OriginSource::Projected;
-  options.originA = 7.0;
-  options.originB = 8.0;
-  mkgrid::Bathymetry b;
-  ASSERT_TRUE(mkgrid::buildBathymetry(grid, options, &b, &error)) << error;
-  EXPECT_EQ(b.values, (std::vector<float>{8, 9, 10, 11, 4, 5, 6, 7, 1, 2, 3, 2.5f}));  // land kept
-  EXPECT_EQ(std::vector<double>({b.longitude, b.latitude, b.orientation, b.landValue}),
-            std::vector<double>({7, 8, 30, 2.5}));
-}
-
-TEST(MkgridBuild, ProjectedOriginGoesThroughTheProjection) {
-  EsriGrid grid;
-  std::string error;
-  ASSERT_TRUE(parse("ncols 1\nnrows 1\nxllcenter 600000\nyllcenter 6200000\ncellsize 100\n-3\n",
-                    &grid, &error));
-  BuildOptions options;
-  options.projection = "UTM-32";
-  mkgrid::Bathymetry b;
-  ASSERT_TRUE(mkgrid::buildBathymetry(grid, options, &b, &error)) << error;
-  Cartography map("UTM-32", 0, 0, 0);
-  double x = 0, y = 0;
-  map.geoToProj(b.longitude, b.latitude, &x, &y);
-  EXPECT_NEAR(x, 600000.0, 1e-4);
-  EXPECT_NEAR(y, 6200000.0, 1e-4);
-  // East of the central meridian: the grid's columns run along grid north,
-  // which lies clockwise of true north.
-  EXPECT_GT(b.orientation, 0.0);
-  EXPECT_NEAR(b.orientation, map.convergence(b.longitude, b.latitude), 1e-12);
-
-  options.projection = "NOT-A-PROJECTION";
-  EXPECT_FALSE(mkgrid::buildBathymetry(grid, options, &b, &error));
-  EXPECT_NE(error.find("unusable projection"), std::string::npos) << error;
-}
-
 class MkgridProgram : public test::ScratchTest {};
-
-// The program's output, stderr included, and its exit code.
-std::string runMkgrid(const std::string& arguments, int* exitCode) {
-  return test::commandOutput(std::string(KARNET_MKGRID_BINARY) + " " + arguments + " 2>&1",
-                             exitCode);
-}
 
 TEST_F(MkgridProgram, MakesAFileTheBathymetryReaderTakes) {
   test::writeBytes(file("in.asc"), kSmallGrid);
@@ -144,6 +93,45 @@ TEST_F(MkgridProgram, MakesAFileTheBathymetryReaderTakes) {
   descriptionFree(d);
 }
 
+// Negated values keep the land value as it is; a given orientation and
+// projected origin are stored as given (LOCAL: the origin is plain metres).
+TEST_F(MkgridProgram, NegatedValuesOrientationAndGivenOrigin) {
+  test::writeBytes(file("in.asc"), kSmallGrid);
+  int code = -1;
+  const std::string output = runMkgrid("--land-value 2.5 --negate -o 30 --origin-proj 7,8 " +
+                                           quoted(file("in.asc")) + " " + quoted(path),
+                                       &code);
+  ASSERT_EQ(code, 0) << output;
+  const test::MadeGrid b = test::readMadeGrid(path);
+  EXPECT_EQ(b.values, (std::vector<float>{8, 9, 10, 11, 4, 5, 6, 7, 1, 2, 3, 2.5f}));
+  EXPECT_EQ(std::vector<double>({b.longitude, b.latitude, b.orientation, b.landValue}),
+            std::vector<double>({7, 8, 30, 2.5}));
+}
+
+TEST_F(MkgridProgram, ProjectedOriginGoesThroughTheProjection) {
+  test::writeBytes(file("in.asc"),
+                   "ncols 1\nnrows 1\nxllcenter 600000\nyllcenter 6200000\ncellsize 100\n-3\n");
+  int code = -1;
+  std::string output = runMkgrid("-p UTM-32 " + quoted(file("in.asc")) + " " + quoted(path), &code);
+  ASSERT_EQ(code, 0) << output;
+  const test::MadeGrid b = test::readMadeGrid(path);
+  Cartography map("UTM-32", 0, 0, 0);
+  double x = 0, y = 0;
+  map.geoToProj(b.longitude, b.latitude, &x, &y);
+  EXPECT_NEAR(x, 600000.0, 1e-4);
+  EXPECT_NEAR(y, 6200000.0, 1e-4);
+  // East of the central meridian: the grid's columns run along grid north,
+  // which lies clockwise of true north.
+  EXPECT_GT(b.orientation, 0.0);
+  EXPECT_NEAR(b.orientation, map.convergence(b.longitude, b.latitude), 1e-12);
+
+  output = runMkgrid("-p NOT-A-PROJECTION " + quoted(file("in.asc")) + " " + quoted(file("x.nc")),
+                     &code);
+  EXPECT_EQ(code, 1);
+  EXPECT_NE(output.find("--projection 'NOT-A-PROJECTION' is unusable"), std::string::npos)
+      << output;
+}
+
 TEST_F(MkgridProgram, BadInputEndsWithCodeOneAndAMessage) {
   test::writeBytes(file("in.asc"), kSmallGrid);
   test::writeBytes(file("bad.asc"), "ncols 2\nnrows 1\nxllcorner 0\nyllcorner 0\n");
@@ -151,7 +139,7 @@ TEST_F(MkgridProgram, BadInputEndsWithCodeOneAndAMessage) {
   const std::string in = "'" + file("in.asc") + "' ";
   const std::string out = "'" + file("out.nc") + "'";
   const std::pair<std::string, const char*> cases[] = {  // arguments, part of the message
-      {"", "Usage: karnet-mkgrid [options] INPUT.asc OUTPUT.nc"},
+      {"", "Usage: karnet-mkgrid [options] INPUT OUTPUT.nc"},
       {"--frobnicate " + in + out, "unknown option '--frobnicate'"},
       {"--land-value abc " + in + out, "bad land value 'abc'"},
       {"--origin-geo 10 " + in + out, "needs two numbers"},
