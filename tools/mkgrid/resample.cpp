@@ -11,6 +11,8 @@
 #include <limits>
 #include <new>
 
+#include <unistd.h>
+
 namespace karnet::mkgrid {
 namespace {
 
@@ -124,6 +126,17 @@ bool resampleSource(const SourceRaster& source, const TargetGrid& grid,
                     std::vector<double>* values, std::string* error) {
   const std::size_t nx = static_cast<std::size_t>(grid.nx);
   const std::size_t ny = static_cast<std::size_t>(grid.ny);
+  // Asking for more than the machine holds would end in the kernel's
+  // out-of-memory killer rather than a failed allocation.
+  const double bytes = static_cast<double>(nx) * static_cast<double>(ny) * 12.0;
+  const double memory =
+      static_cast<double>(sysconf(_SC_PHYS_PAGES)) * static_cast<double>(sysconf(_SC_PAGESIZE));
+  if (memory > 0.0 && bytes > memory) {
+    *error = std::to_string(nx) + " x " + std::to_string(ny) + " nodes need " +
+             std::to_string(static_cast<long long>(bytes / 1073741824.0 + 1.0)) +
+             " GiB, more than this machine's memory; give a larger --spacing or a smaller extent";
+    return false;
+  }
   try {
     values->assign(nx * ny, kNoValue);
   } catch (const std::bad_alloc&) {

@@ -96,11 +96,12 @@ void transformPoints(OGRCoordinateTransformationH transform, std::vector<Point>*
   *points = std::move(kept);
 }
 
-// A length rounded to three significant digits (a spacing easy to read).
+// A length cut to three significant digits (a spacing easy to read, never
+// coarser than the cells it comes from).
 double roundedLength(double value) {
   if (!(value > 0.0) || !std::isfinite(value)) return value;
   const double unit = std::pow(10.0, std::floor(std::log10(value)) - 2.0);
-  return std::round(value / unit) * unit;
+  return std::floor(value / unit * (1.0 + 1e-12)) * unit;
 }
 
 // Longitude and latitude of the middle of the region (for --projection auto).
