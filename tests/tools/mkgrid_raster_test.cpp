@@ -150,8 +150,19 @@ TEST_F(MkgridRaster, LonLatNetCdfNeedsAProjectionAndAutoPicksTheUtmZone) {
   const std::string south = file("south.nc");
   test::makeNc(south, lonLatCdl(11, -34.0, 11, 150.0));
   test::putValues(south, "elevation", lonLatValues(11, -34.0, 11, 150.0, southHeight));
-  const MadeGrid s = make("--projection auto --spacing 1000", south);
+  const MadeGrid s = make("--projection auto", south, &output);
   EXPECT_EQ(s.projection, "UTM-56S");
+  // Without --spacing: the smaller side of a source cell there (0.1 degree of
+  // longitude at 33.5 S, some 9.3 km), cut to three digits, and bilinear.
+  Cartography utm56s("UTM-56S", 0, 0, 0);
+  double xa, ya, xb, yb;
+  utm56s.geoToProj(150.5, -33.5, &xa, &ya);
+  utm56s.geoToProj(150.6, -33.5, &xb, &yb);
+  const double cell = std::hypot(xb - xa, yb - ya);
+  EXPECT_LE(s.dx, cell);
+  EXPECT_GT(s.dx, cell - 10.0);
+  EXPECT_EQ(s.dx, s.dy);
+  EXPECT_NE(output.find("bilinear"), std::string::npos) << output;
   NodePlacer southNodes(s);
   double x, y, lon, lat;
   southNodes.place(s.nx / 2, s.ny / 2, &x, &y);
@@ -215,26 +226,29 @@ TEST_F(MkgridRaster, NodataAndOutsideBecomeLand) {
   }
 }
 
-// A grid turned 30 degrees from north finds a deep square where it lies.
+// A grid turned 30 degrees from true north finds a deep square where it lies.
+// The site lies far east of the zone's central meridian, where grid north is
+// 3 degrees off true north: a grid turned from the wrong north misses it.
 TEST_F(MkgridRaster, TurnedGridPlacesAFeatureWhereItLies) {
-  const double transform[6] = {540000, 50, 0, 6105000, 0, -50};
+  const double transform[6] = {740000, 50, 0, 6105000, 0, -50};
   std::vector<double> values(100 * 100, -10.0);
   for (int r = 20; r < 30; ++r) {
-    for (int c = 60; c < 70; ++c) values[r * 100 + c] = -500.0;  // x 543000..543500, y 6103500..6104000
+    for (int c = 60; c < 70; ++c) values[r * 100 + c] = -500.0;  // x 743000..743500, y 6103500..6104000
   }
   test::writeGeoTiff(file("pit.tif"), 100, 100, transform, kUtm32, values);
   const MadeGrid g =
-      make("--orientation 30 --spacing 50 --extent-proj 540500,6100500,544500,6104500", file("pit.tif"));
+      make("--orientation 30 --spacing 50 --extent-proj 740500,6100500,744500,6104500", file("pit.tif"));
   EXPECT_EQ(g.orientation, 30.0);
   NodePlacer nodes(g);
+  EXPECT_GT(nodes.map.convergence(g.longitude, g.latitude), 2.5);
   int inPit = 0, around = 0;
   for (int j = 0; j < g.ny; ++j) {
     for (int i = 0; i < g.nx; ++i) {
       double x, y;
       nodes.place(i, j, &x, &y);
-      const bool deep = x > 543075 && x < 543425 && y > 6103575 && y < 6103925;
-      const bool flat = (x < 542925 || x > 543575 || y < 6103425 || y > 6104075) &&
-                        x > 540075 && x < 544925 && y > 6100075 && y < 6104925;
+      const bool deep = x > 743075 && x < 743425 && y > 6103575 && y < 6103925;
+      const bool flat = (x < 742925 || x > 743575 || y < 6103425 || y > 6104075) &&
+                        x > 740075 && x < 744925 && y > 6100075 && y < 6104925;
       if (deep) {
         ++inPit;
         ASSERT_NEAR(g.at(i, j), -500.0f, 1e-3) << i << ", " << j;
