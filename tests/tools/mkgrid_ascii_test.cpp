@@ -7,11 +7,11 @@
 #include <vector>
 
 #include "input/bathymetry_read.h"
-#include "tools/mkgrid_test_support.h"
 #include "input/cartography.h"
 #include "mkgrid/esri_ascii.h"
 #include "support/file_description.h"
 #include "support/float_grid.h"
+#include "tools/mkgrid_test_support.h"
 
 namespace karnet {
 namespace {
@@ -36,9 +36,10 @@ bool parse(const std::string& text, EsriGrid* grid, std::string* error) {
 TEST(MkgridAscii, HeaderVariants) {
   EsriGrid grid;
   std::string error;
-  ASSERT_TRUE(parse("NCOLS 2\r\nNROWS 2\r\nXLLCENTER -5.5\r\nyllcenter 7\r\nDX 10\r\ndy 20\r\n"
-                    "1 2 3\r\n4\r\n",
-                    &grid, &error))
+  ASSERT_TRUE(
+      parse("NCOLS 2\r\nNROWS 2\r\nXLLCENTER -5.5\r\nyllcenter 7\r\nDX 10\r\ndy 20\r\n"
+            "1 2 3\r\n4\r\n",
+            &grid, &error))
       << error;
   EXPECT_FALSE(grid.xIsCorner || grid.yIsCorner || grid.hasNodata);
   EXPECT_EQ(std::vector<double>({grid.xll, grid.yll, grid.dx, grid.dy}),
@@ -48,7 +49,8 @@ TEST(MkgridAscii, HeaderVariants) {
 
 TEST(MkgridAscii, FaultsAreNamed) {
   const std::string head = "ncols 2\nnrows 2\nxllcorner 0\nyllcorner 0\ncellsize 1\n";
-  const std::pair<std::string, const char*> cases[] = {  // text, part of the message
+  const std::pair<std::string, const char*> cases[] = {
+      // text, part of the message
       {head + "1 2 3\n", "expected 4 values"},
       {head + "1 2 3 4 5\n", "line 6: more values"},
       {head + "1 2 x 4\n", "line 6: bad grid value 'x'"},
@@ -138,7 +140,8 @@ TEST_F(MkgridProgram, BadInputEndsWithCodeOneAndAMessage) {
   test::writeBytes(file("out.nc"), "earlier");
   const std::string in = "'" + file("in.asc") + "' ";
   const std::string out = "'" + file("out.nc") + "'";
-  const std::pair<std::string, const char*> cases[] = {  // arguments, part of the message
+  const std::pair<std::string, const char*> cases[] = {
+      // arguments, part of the message
       {"", "Usage: karnet-mkgrid [options] INPUT OUTPUT.nc"},
       {"--frobnicate " + in + out, "unknown option '--frobnicate'"},
       {"--land-value abc " + in + out, "bad land value 'abc'"},

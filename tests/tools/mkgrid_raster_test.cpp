@@ -24,7 +24,8 @@ constexpr int kUtm32 = 32632;
 class MkgridRaster : public test::ScratchTest {
  protected:
   // Runs the program on input, writing out; expects success.
-  MadeGrid make(const std::string& options, const std::string& input, std::string* output = nullptr) {
+  MadeGrid make(const std::string& options, const std::string& input,
+                std::string* output = nullptr) {
     int code = -1;
     const std::string text = runMkgrid(options + " " + quoted(input) + " " + quoted(path), &code);
     if (output != nullptr) *output = text;
@@ -36,7 +37,9 @@ class MkgridRaster : public test::ScratchTest {
 // A plane in projected metres, bilinearly resampled, keeps its value at every
 // node: the nodes must lie where the file says they do.
 TEST_F(MkgridRaster, LinearFieldKeepsItsValueAtEveryNode) {
-  auto field = [](double x, double y) { return -100.0 - 0.01 * (x - 540000) - 0.02 * (y - 6100000); };
+  auto field = [](double x, double y) {
+    return -100.0 - 0.01 * (x - 540000) - 0.02 * (y - 6100000);
+  };
   const double transform[6] = {540000, 100, 0, 6105000, 0, -100};
   std::vector<double> values;
   for (int r = 0; r < 50; ++r) {
@@ -97,12 +100,13 @@ std::string lonLatCdl(int nlat, double lat0, int nlon, double lon0, const std::s
          " ;\nvariables:\n double lat(lat) ; lat:units = \"degrees_north\" ;\n"
          " double lon(lon) ; lon:units = \"degrees_east\" ;\n"
          " float elevation(lat, lon) ; elevation:_FillValue = -9999.f ;"
-         " elevation:scale_factor = 2.f ; elevation:add_offset = -1000.f ;\n" + extra +
-         "data:\n lat = " + lat + " ;\n lon = " + lon + " ;\n";
+         " elevation:scale_factor = 2.f ; elevation:add_offset = -1000.f ;\n" +
+         extra + "data:\n lat = " + lat + " ;\n lon = " + lon + " ;\n";
 }
 
 // Stored (packed) values, southern row first; stored = (height + 1000) / 2.
-std::vector<float> lonLatValues(int nlat, double lat0, int nlon, double lon0, double (*height)(double, double)) {
+std::vector<float> lonLatValues(int nlat, double lat0, int nlon, double lon0,
+                                double (*height)(double, double)) {
   std::vector<float> values;
   for (int k = 0; k < nlat; ++k) {
     for (int m = 0; m < nlon; ++m) {
@@ -112,8 +116,12 @@ std::vector<float> lonLatValues(int nlat, double lat0, int nlon, double lon0, do
   return values;
 }
 
-double northHeight(double lon, double lat) { return -40.0 - 10.0 * (lon - 8.0) - 20.0 * (lat - 54.0); }
-double southHeight(double lon, double lat) { return -200.0 + 30.0 * (lon - 150.0) - 5.0 * (lat + 34.0); }
+double northHeight(double lon, double lat) {
+  return -40.0 - 10.0 * (lon - 8.0) - 20.0 * (lat - 54.0);
+}
+double southHeight(double lon, double lat) {
+  return -200.0 + 30.0 * (lon - 150.0) - 5.0 * (lat + 34.0);
+}
 
 TEST_F(MkgridRaster, LonLatNetCdfNeedsAProjectionAndAutoPicksTheUtmZone) {
   const std::string nc = file("gebco.nc");
@@ -184,8 +192,9 @@ TEST_F(MkgridRaster, VariablesAndDegreesWithoutCrs) {
   const MadeGrid g = make("-p UTM-32 --variable other --spacing 3000", nc);
   EXPECT_EQ(g.at(g.nx / 2, g.ny / 2), -7.0f);
 
-  test::writeBytes(file("deg.asc"), "ncols 2\nnrows 2\nxllcorner 8\nyllcorner 54\ncellsize 0.1\n"
-                                    "-1 -2\n-3 -4\n");
+  test::writeBytes(file("deg.asc"),
+                   "ncols 2\nnrows 2\nxllcorner 8\nyllcorner 54\ncellsize 0.1\n"
+                   "-1 -2\n-3 -4\n");
   output = runMkgrid(quoted(file("deg.asc")) + " " + quoted(file("deg.nc")), &code);
   EXPECT_EQ(code, 1);
   EXPECT_NE(output.find("look like degrees"), std::string::npos) << output;
@@ -203,9 +212,9 @@ TEST_F(MkgridRaster, NodataAndOutsideBecomeLand) {
   const double nodata = -9999.0;
   test::writeGeoTiff(file("holes.tif"), 20, 20, transform, kUtm32, values, &nodata);
   for (const char* spacing : {"100", "50"}) {
-    const MadeGrid g = make(std::string("-l 3 --spacing ") + spacing +
-                                " --extent-proj 500000,6000000,502500,6002000",
-                            file("holes.tif"));
+    const MadeGrid g = make(
+        std::string("-l 3 --spacing ") + spacing + " --extent-proj 500000,6000000,502500,6002000",
+        file("holes.tif"));
     EXPECT_EQ(g.landValue, 3.0f);
     NodePlacer nodes(g);
     for (int j = 0; j < g.ny; ++j) {
@@ -233,11 +242,12 @@ TEST_F(MkgridRaster, TurnedGridPlacesAFeatureWhereItLies) {
   const double transform[6] = {740000, 50, 0, 6105000, 0, -50};
   std::vector<double> values(100 * 100, -10.0);
   for (int r = 20; r < 30; ++r) {
-    for (int c = 60; c < 70; ++c) values[r * 100 + c] = -500.0;  // x 743000..743500, y 6103500..6104000
+    for (int c = 60; c < 70; ++c)
+      values[r * 100 + c] = -500.0;  // x 743000..743500, y 6103500..6104000
   }
   test::writeGeoTiff(file("pit.tif"), 100, 100, transform, kUtm32, values);
-  const MadeGrid g =
-      make("--orientation 30 --spacing 50 --extent-proj 740500,6100500,744500,6104500", file("pit.tif"));
+  const MadeGrid g = make(
+      "--orientation 30 --spacing 50 --extent-proj 740500,6100500,744500,6104500", file("pit.tif"));
   EXPECT_EQ(g.orientation, 30.0);
   NodePlacer nodes(g);
   EXPECT_GT(nodes.map.convergence(g.longitude, g.latitude), 2.5);
@@ -247,8 +257,8 @@ TEST_F(MkgridRaster, TurnedGridPlacesAFeatureWhereItLies) {
       double x, y;
       nodes.place(i, j, &x, &y);
       const bool deep = x > 743075 && x < 743425 && y > 6103575 && y < 6103925;
-      const bool flat = (x < 742925 || x > 743575 || y < 6103425 || y > 6104075) &&
-                        x > 740075 && x < 744925 && y > 6100075 && y < 6104925;
+      const bool flat = (x < 742925 || x > 743575 || y < 6103425 || y > 6104075) && x > 740075 &&
+                        x < 744925 && y > 6100075 && y < 6104925;
       if (deep) {
         ++inPit;
         ASSERT_NEAR(g.at(i, j), -500.0f, 1e-3) << i << ", " << j;
@@ -274,7 +284,8 @@ TEST_F(MkgridRaster, KarnetRunsOnTheMadeBathymetry) {
   for (int k = 0; k < 6; ++k) {
     const std::string x = std::to_string(543000 + 1000 * k), y = std::to_string(6102000 + 1200 * k);
     for (int z = 1; z <= 25; z += 4) {
-      casts += x + " " + y + " " + std::to_string(-z) + " " + std::to_string(10 + 0.1 * z + k) + "\n";
+      casts +=
+          x + " " + y + " " + std::to_string(-z) + " " + std::to_string(10 + 0.1 * z + k) + "\n";
     }
   }
   e2e::writeFile(file("observations.txt"), casts);
@@ -294,7 +305,8 @@ TEST_F(MkgridRaster, BadInputIsNamedAndLeavesNoFile) {
   test::makeNc(nc, lonLatCdl(3, 54.0, 3, 8.0));
   test::putValues(nc, "elevation", std::vector<float>(9, 0.0f));
   const std::string tif = quoted(file("small.tif")) + " ";
-  const std::pair<std::string, const char*> cases[] = {  // arguments, part of the message
+  const std::pair<std::string, const char*> cases[] = {
+      // arguments, part of the message
       {quoted(file("text.tif")) + " ", "text.tif: not a raster GDAL reads"},
       {quoted(file("none.tif")) + " ", "cannot open"},
       {"-p UTM-32 --variable depth " + quoted(nc) + " ", "no variable 'depth'"},
@@ -304,7 +316,7 @@ TEST_F(MkgridRaster, BadInputIsNamedAndLeavesNoFile) {
       {"--spacing 0.001 " + tif, "--spacing 0.001,0.001 gives 2000000 x 2000000 nodes"},
       {"--spacing -5 " + tif, "--spacing must be between"},
       {"--resampling magic " + tif, "--resampling is bilinear, average, nearest or cubic"},
-      {"--origin-geo 9,55 " + tif, "--origin-geo: " },
+      {"--origin-geo 9,55 " + tif, "--origin-geo: "},
       {"-p LOCAL --extent 8,54,9,55 " + tif, "--extent is in degrees"},
       {"--source-crs EPSG:999999 " + tif, "--source-crs 'EPSG:999999'"},
   };
@@ -318,8 +330,8 @@ TEST_F(MkgridRaster, BadInputIsNamedAndLeavesNoFile) {
   EXPECT_NE(runMkgrid("--version", &code).find("karnet-mkgrid 1."), std::string::npos);
   EXPECT_EQ(code, 0);
   const std::string help = runMkgrid("--help", &code);
-  for (const char* option : {"--spacing", "--extent", "--extent-proj", "--variable", "--orientation",
-                             "--resampling", "--source-crs", "auto"}) {
+  for (const char* option : {"--spacing", "--extent", "--extent-proj", "--variable",
+                             "--orientation", "--resampling", "--source-crs", "auto"}) {
     EXPECT_NE(help.find(option), std::string::npos) << option;
   }
 }

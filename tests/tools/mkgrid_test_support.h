@@ -27,8 +27,8 @@ inline std::string quoted(const std::string& text) { return "'" + text + "'"; }
 
 // A one-band Float64 GeoTIFF: values row by row, the northern row first;
 // epsg 0 writes no CRS.
-inline void writeGeoTiff(const std::string& path, int width, int height,
-                         const double transform[6], int epsg, const std::vector<double>& values,
+inline void writeGeoTiff(const std::string& path, int width, int height, const double transform[6],
+                         int epsg, const std::vector<double>& values,
                          const double* nodata = nullptr) {
   GDALAllRegister();
   GDALDatasetH dataset = GDALCreate(GDALGetDriverByName("GTiff"), path.c_str(), width, height, 1,
@@ -43,9 +43,9 @@ inline void writeGeoTiff(const std::string& path, int width, int height,
   }
   GDALRasterBandH band = GDALGetRasterBand(dataset, 1);
   if (nodata != nullptr) GDALSetRasterNoDataValue(band, *nodata);
-  const CPLErr written = GDALRasterIO(band, GF_Write, 0, 0, width, height,
-                                      const_cast<double*>(values.data()), width, height,
-                                      GDT_Float64, 0, 0);
+  const CPLErr written =
+      GDALRasterIO(band, GF_Write, 0, 0, width, height, const_cast<double*>(values.data()), width,
+                   height, GDT_Float64, 0, 0);
   GDALClose(dataset);
   if (written != CE_None) throw std::runtime_error("cannot write " + path);
 }
@@ -66,7 +66,8 @@ inline MadeGrid readMadeGrid(const std::string& path) {
   grdInitSystem();
   GrdHeader* header = nullptr;
   GrdFile* file = nullptr;
-  if (grdFileRead(path.c_str(), &header, &file) != 0) throw std::runtime_error("unreadable " + path);
+  if (grdFileRead(path.c_str(), &header, &file) != 0)
+    throw std::runtime_error("unreadable " + path);
   MadeGrid grid;
   std::int32_t j0, k0, nx, ny;
   double x0, y0;

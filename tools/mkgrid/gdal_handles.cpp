@@ -44,8 +44,8 @@ Srs srsFromText(const std::string& text, std::string* error) {
   Srs srs(OSRNewSpatialReference(nullptr));
   CPLErrorReset();
   if (!srs || OSRSetFromUserInput(srs.get(), definition.c_str()) != OGRERR_NONE) {
-    *error = "'" + text + "' is not a coordinate reference system: " +
-             lastGdalError("not recognised");
+    *error =
+        "'" + text + "' is not a coordinate reference system: " + lastGdalError("not recognised");
     return Srs();
   }
   OSRSetAxisMappingStrategy(srs.get(), OAMS_TRADITIONAL_GIS_ORDER);

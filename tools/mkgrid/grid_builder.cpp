@@ -76,12 +76,12 @@ bool makeBathymetry(const MkgridOptions& options, Bathymetry* result, std::strin
     return false;
   }
   const char* methods[] = {"", "bilinear", "average", "nearest", "cubic"};
-  *summary = "  source: " + options.input + ", " + source.what + "\n" + notes + "  " +
-             (grid.copyCells ? std::string("nodes copied from the source's cells")
-                             : std::string("resampled (") +
-                                   methods[static_cast<int>(grid.method)] + ")") +
-             "; " + std::to_string(land) + " of " + std::to_string(raw.size()) +
-             " nodes without a value set to the land value\n";
+  *summary =
+      "  source: " + options.input + ", " + source.what + "\n" + notes + "  " +
+      (grid.copyCells ? std::string("nodes copied from the source's cells")
+                      : std::string("resampled (") + methods[static_cast<int>(grid.method)] + ")") +
+      "; " + std::to_string(land) + " of " + std::to_string(raw.size()) +
+      " nodes without a value set to the land value\n";
   *result = std::move(out);
   return true;
 }
@@ -101,15 +101,20 @@ bool writeBathymetry(const std::string& fileName, const Bathymetry& b, std::stri
     return false;
   }
   GrdItem* item = grdItemD(header, 1);
-  const float misc[7] = {static_cast<float>(b.orientation), kDelete, kMiscThird, b.landValue,
-                         kDelete, kDelete, kDelete};
+  const float misc[7] = {static_cast<float>(b.orientation),
+                         kDelete,
+                         kMiscThird,
+                         b.landValue,
+                         kDelete,
+                         kDelete,
+                         kDelete};
   const bool described =
       grdSetDeleteValFloat(header, kDelete) == 0 && grdSetDataType(header, 0) == 0 &&
       grdSetItemInfo(header, item, kItemType, "bathymetry", kMetre, 1) == 0 &&
       grdSetItemAxisEqD2(item, kMetre, b.nx, b.ny, 0.0f, 0.0f, b.dx, b.dy) == 0 &&
       grdAddCustomBlock(header, 1, "Q84_Misc", 7, misc) == 0 &&
-      grdSetGeoInfoUTMProj(header, b.projection.c_str(), b.longitude, b.latitude,
-                           b.orientation) == 0;
+      grdSetGeoInfoUTMProj(header, b.projection.c_str(), b.longitude, b.latitude, b.orientation) ==
+          0;
   if (!described) {
     *error = "cannot describe the file (grid size, spacing or origin out of range)";
     grdHeaderDestroy(&header);

@@ -35,8 +35,7 @@ bool makeBathymetry(const MkgridOptions& options, Bathymetry* result, std::strin
 
 // Writes the bathymetry file: item "bathymetry" on y and x, the "Q84_Misc"
 // block (orientation, land value) and the geographic information.
-bool writeBathymetry(const std::string& fileName, const Bathymetry& bathymetry,
-                     std::string* error);
+bool writeBathymetry(const std::string& fileName, const Bathymetry& bathymetry, std::string* error);
 
 }  // namespace karnet::mkgrid
 

@@ -26,11 +26,11 @@ int main(int argc, char** argv) {
     std::fprintf(stderr, "karnet-mkgrid: %s\n", message.c_str());
     return 1;
   }
-  std::printf("%s: %d x %d nodes, spacing %g x %g m, %s, origin %.8g, %.8g, orientation %.6g deg\n%s",
-              options.output.c_str(), bathymetry.nx, bathymetry.ny, bathymetry.dx, bathymetry.dy,
-              bathymetry.projection.size() > 40 ? "projection from the source's WKT"
-                                                : bathymetry.projection.c_str(),
-              bathymetry.longitude, bathymetry.latitude, bathymetry.orientation,
-              summary.c_str());
+  std::printf(
+      "%s: %d x %d nodes, spacing %g x %g m, %s, origin %.8g, %.8g, orientation %.6g deg\n%s",
+      options.output.c_str(), bathymetry.nx, bathymetry.ny, bathymetry.dx, bathymetry.dy,
+      bathymetry.projection.size() > 40 ? "projection from the source's WKT"
+                                        : bathymetry.projection.c_str(),
+      bathymetry.longitude, bathymetry.latitude, bathymetry.orientation, summary.c_str());
   return 0;
 }

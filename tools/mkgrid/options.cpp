@@ -60,9 +60,9 @@ bool parseList(const std::string& text, std::size_t count, double* values) {
   for (std::size_t n = 0; n < count; ++n) {
     const std::size_t comma = n + 1 < count ? text.find(',', start) : std::string::npos;
     if (n + 1 < count && comma == std::string::npos) return false;
-    if (!parseNumber(text.substr(start, comma == std::string::npos ? std::string::npos
-                                                                    : comma - start),
-                     &values[n])) {
+    if (!parseNumber(
+            text.substr(start, comma == std::string::npos ? std::string::npos : comma - start),
+            &values[n])) {
       return false;
     }
     start = comma + 1;
@@ -142,8 +142,7 @@ ParseResult parseCommandLine(int argc, const char* const* argv, MkgridOptions* o
       }
       options->originA = pair[0];
       options->originB = pair[1];
-      options->origin =
-          arg == "--origin-geo" ? OriginSource::Geographic : OriginSource::Projected;
+      options->origin = arg == "--origin-geo" ? OriginSource::Geographic : OriginSource::Projected;
       originGiven = true;
     } else if (arg == "-o" || arg == "--orientation") {
       if (!takeValue()) return ParseResult::Error;
@@ -162,9 +161,8 @@ ParseResult parseCommandLine(int argc, const char* const* argv, MkgridOptions* o
       } else {
         return fail(message, "--spacing needs DX or DX,DY in metres, not '" + text + "'");
       }
-      if (!(options->dx > 0.0) || !(options->dy > 0.0) || options->dx > 1e7 ||
-          options->dy > 1e7 || static_cast<float>(options->dx) < 1e-6f ||
-          static_cast<float>(options->dy) < 1e-6f) {
+      if (!(options->dx > 0.0) || !(options->dy > 0.0) || options->dx > 1e7 || options->dy > 1e7 ||
+          static_cast<float>(options->dx) < 1e-6f || static_cast<float>(options->dy) < 1e-6f) {
         return fail(message, "--spacing must be between 1e-6 and 1e7 metres, not '" + text + "'");
       }
       options->hasSpacing = true;
@@ -175,8 +173,8 @@ ParseResult parseCommandLine(int argc, const char* const* argv, MkgridOptions* o
       double* b = options->box;
       if (!parseList(text, 4, b)) {
         return fail(message, arg + " needs four numbers " +
-                                 (geographic ? "LON0,LAT0,LON1,LAT1" : "X0,Y0,X1,Y1") +
-                                 ", not '" + text + "'");
+                                 (geographic ? "LON0,LAT0,LON1,LAT1" : "X0,Y0,X1,Y1") + ", not '" +
+                                 text + "'");
       }
       if (!(b[0] < b[2]) || !(b[1] < b[3])) {
         return fail(message, arg + " '" + text + "' is empty: the first corner must lie " +
@@ -201,8 +199,8 @@ ParseResult parseCommandLine(int argc, const char* const* argv, MkgridOptions* o
       } else if (strcasecmp(t, "cubic") == 0) {
         options->resampling = Resampling::Cubic;
       } else {
-        return fail(message, "--resampling is bilinear, average, nearest or cubic, not '" +
-                                 text + "'");
+        return fail(message,
+                    "--resampling is bilinear, average, nearest or cubic, not '" + text + "'");
       }
     } else if (arg == "-l" || arg == "--land-value") {
       if (!takeValue()) return ParseResult::Error;

@@ -21,22 +21,22 @@ enum class Resampling { Automatic, Bilinear, Average, Nearest, Cubic };
 
 // Everything the command line says.
 struct MkgridOptions {
-  std::string projection;       // empty: the source's own, else LOCAL; "auto": UTM zone
-  std::string sourceCrs;        // replaces the source's CRS (or gives it one)
-  std::string variable;         // the source variable; empty: the only 2-D one
+  std::string projection;  // empty: the source's own, else LOCAL; "auto": UTM zone
+  std::string sourceCrs;   // replaces the source's CRS (or gives it one)
+  std::string variable;    // the source variable; empty: the only 2-D one
   OriginSource origin = OriginSource::Grid;
   double originA = 0.0;
   double originB = 0.0;
   bool hasOrientation = false;  // else the meridian convergence at the origin
   double orientation = 0.0;
-  bool hasSpacing = false;      // else the source's cell size
+  bool hasSpacing = false;  // else the source's cell size
   double dx = 0.0;
   double dy = 0.0;
   ExtentKind extent = ExtentKind::Source;
   double box[4] = {0, 0, 0, 0};
   Resampling resampling = Resampling::Automatic;
-  double landValue = 0.0;       // NODATA cells and cells outside the source become this
-  bool negate = false;          // store -value (grids of positive depths)
+  double landValue = 0.0;  // NODATA cells and cells outside the source become this
+  bool negate = false;     // store -value (grids of positive depths)
   std::string title;
   std::string input;
   std::string output;

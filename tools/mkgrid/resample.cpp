@@ -5,13 +5,12 @@
 #include <cpl_error.h>
 #include <cpl_string.h>
 #include <gdalwarper.h>
+#include <unistd.h>
 
 #include <cmath>
 #include <cstdio>
 #include <limits>
 #include <new>
-
-#include <unistd.h>
 
 namespace karnet::mkgrid {
 namespace {
@@ -45,10 +44,14 @@ bool copyCells(const SourceRaster& source, const TargetGrid& grid, std::vector<d
 
 GDALResampleAlg gdalMethod(Resampling method) {
   switch (method) {
-    case Resampling::Average: return GRA_Average;
-    case Resampling::Nearest: return GRA_NearestNeighbour;
-    case Resampling::Cubic: return GRA_Cubic;
-    default: return GRA_Bilinear;
+    case Resampling::Average:
+      return GRA_Average;
+    case Resampling::Nearest:
+      return GRA_NearestNeighbour;
+    case Resampling::Cubic:
+      return GRA_Cubic;
+    default:
+      return GRA_Bilinear;
   }
 }
 
@@ -80,8 +83,8 @@ bool warp(const SourceRaster& source, const TargetGrid& grid, std::vector<double
     transformOptions = CSLSetNameValue(transformOptions, "DST_SRS", grid.targetWkt.c_str());
   }
   CPLErrorReset();
-  void* transformer = GDALCreateGenImgProjTransformer2(source.dataset.get(), target.get(),
-                                                       transformOptions);
+  void* transformer =
+      GDALCreateGenImgProjTransformer2(source.dataset.get(), target.get(), transformOptions);
   CSLDestroy(transformOptions);
   if (transformer == nullptr) {
     *error = "cannot relate the source to the grid: " + lastGdalError("no transformer");
@@ -110,8 +113,7 @@ bool warp(const SourceRaster& source, const TargetGrid& grid, std::vector<double
 
   GDALWarpOperationH operation = GDALCreateWarpOperation(warpOptions);
   const bool warped =
-      operation != nullptr &&
-      GDALChunkAndWarpImage(operation, 0, 0, grid.nx, grid.ny) == CE_None;
+      operation != nullptr && GDALChunkAndWarpImage(operation, 0, 0, grid.nx, grid.ny) == CE_None;
   if (!warped) *error = "resampling failed: " + lastGdalError("GDAL's warper gave up");
   if (operation != nullptr) GDALDestroyWarpOperation(operation);
   GDALDestroyGenImgProjTransformer(transformer);
@@ -122,8 +124,8 @@ bool warp(const SourceRaster& source, const TargetGrid& grid, std::vector<double
 
 }  // namespace
 
-bool resampleSource(const SourceRaster& source, const TargetGrid& grid,
-                    std::vector<double>* values, std::string* error) {
+bool resampleSource(const SourceRaster& source, const TargetGrid& grid, std::vector<double>* values,
+                    std::string* error) {
   const std::size_t nx = static_cast<std::size_t>(grid.nx);
   const std::size_t ny = static_cast<std::size_t>(grid.ny);
   // Asking for more than the machine holds would end in the kernel's
@@ -140,8 +142,7 @@ bool resampleSource(const SourceRaster& source, const TargetGrid& grid,
   try {
     values->assign(nx * ny, kNoValue);
   } catch (const std::bad_alloc&) {
-    *error = "not enough memory for " + std::to_string(nx) + " x " + std::to_string(ny) +
-             " nodes";
+    *error = "not enough memory for " + std::to_string(nx) + " x " + std::to_string(ny) + " nodes";
     return false;
   }
   if (grid.copyCells) return copyCells(source, grid, values, error);

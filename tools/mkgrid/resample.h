@@ -13,8 +13,8 @@ namespace karnet::mkgrid {
 // (j = 0 the southernmost row): copied where the nodes are the source's cell
 // centres, else resampled by GDAL's warper. NaN marks nodes without a value
 // (NODATA cells, outside the source). Scale and offset are not applied yet.
-bool resampleSource(const SourceRaster& source, const TargetGrid& grid,
-                    std::vector<double>* values, std::string* error);
+bool resampleSource(const SourceRaster& source, const TargetGrid& grid, std::vector<double>* values,
+                    std::string* error);
 
 }  // namespace karnet::mkgrid
 

@@ -21,8 +21,8 @@ bool isEsriAscii(const std::string& path) {
   std::ifstream in(path);
   std::string first;
   if (!(in >> first)) return false;
-  for (const char* keyword : {"ncols", "nrows", "xllcorner", "xllcenter", "yllcorner",
-                              "yllcenter", "cellsize", "nodata_value", "dx", "dy"}) {
+  for (const char* keyword : {"ncols", "nrows", "xllcorner", "xllcenter", "yllcorner", "yllcenter",
+                              "cellsize", "nodata_value", "dx", "dy"}) {
     if (strcasecmp(first.c_str(), keyword) == 0) return true;
   }
   return false;
@@ -32,7 +32,8 @@ bool isEsriAscii(const std::string& path) {
 Srs sidecarCrs(const std::string& path, std::string* error, bool* failed) {
   *failed = false;
   const std::size_t dot = path.find_last_of("./");
-  const std::string stem = dot != std::string::npos && path[dot] == '.' ? path.substr(0, dot) : path;
+  const std::string stem =
+      dot != std::string::npos && path[dot] == '.' ? path.substr(0, dot) : path;
   for (const char* extension : {".prj", ".PRJ"}) {
     std::ifstream in(stem + extension);
     if (!in) continue;
@@ -60,9 +61,9 @@ bool openEsriAscii(const std::string& path, SourceRaster* source, std::string* e
   Srs crs = sidecarCrs(path, error, &failed);
   if (failed) return false;
   GDALDriverH memory = GDALGetDriverByName("MEM");
-  Dataset dataset(memory == nullptr ? nullptr
-                                    : GDALCreate(memory, "", grid.ncols, grid.nrows, 1,
-                                                 GDT_Float64, nullptr));
+  Dataset dataset(memory == nullptr
+                      ? nullptr
+                      : GDALCreate(memory, "", grid.ncols, grid.nrows, 1, GDT_Float64, nullptr));
   if (!dataset) {
     *error = path + ": no memory for " + std::to_string(grid.ncols) + " x " +
              std::to_string(grid.nrows) + " cells";
@@ -130,8 +131,8 @@ bool pickVariable(const std::string& path, const std::string& variable, Dataset*
                   std::string* chosen, std::string* error) {
   const auto list = subdatasets(dataset->get());
   if (list.empty()) {
-    const char* name = GDALGetMetadataItem(GDALGetRasterBand(dataset->get(), 1),
-                                           "NETCDF_VARNAME", nullptr);
+    const char* name =
+        GDALGetMetadataItem(GDALGetRasterBand(dataset->get(), 1), "NETCDF_VARNAME", nullptr);
     if (!variable.empty() && (name == nullptr || variable != name)) {
       *error = path + ": no variable '" + variable + "'" +
                (name != nullptr ? std::string(" (its only one is '") + name + "')"
@@ -165,11 +166,11 @@ bool pickVariable(const std::string& path, const std::string& variable, Dataset*
     return false;
   }
   CPLErrorReset();
-  Dataset sub(GDALOpenEx(pick.c_str(), GDAL_OF_RASTER | GDAL_OF_READONLY, nullptr, nullptr,
-                         nullptr));
+  Dataset sub(
+      GDALOpenEx(pick.c_str(), GDAL_OF_RASTER | GDAL_OF_READONLY, nullptr, nullptr, nullptr));
   if (!sub || GDALGetRasterCount(sub.get()) < 1) {
-    *error = path + ": cannot read variable '" + variableOf(pick) + "': " +
-             lastGdalError("GDAL gives no raster");
+    *error = path + ": cannot read variable '" + variableOf(pick) +
+             "': " + lastGdalError("GDAL gives no raster");
     return false;
   }
   *dataset = std::move(sub);
@@ -180,8 +181,8 @@ bool pickVariable(const std::string& path, const std::string& variable, Dataset*
 bool openWithGdal(const std::string& path, const std::string& variable, SourceRaster* source,
                   std::string* error) {
   CPLErrorReset();
-  Dataset dataset(GDALOpenEx(path.c_str(), GDAL_OF_RASTER | GDAL_OF_READONLY, nullptr, nullptr,
-                             nullptr));
+  Dataset dataset(
+      GDALOpenEx(path.c_str(), GDAL_OF_RASTER | GDAL_OF_READONLY, nullptr, nullptr, nullptr));
   if (!dataset) {
     std::ifstream probe(path);
     *error = probe ? path + ": not a raster GDAL reads (" + lastGdalError("unknown format") + ")"
@@ -202,13 +203,13 @@ bool openWithGdal(const std::string& path, const std::string& variable, SourceRa
     return false;
   }
   if (GDALGetGeoTransform(dataset.get(), source->transform) != CE_None) {
-    *error = path + ": has no georeferencing (no cell size and position); 2-D coordinate "
-                    "arrays and ground control points are not taken";
+    *error = path +
+             ": has no georeferencing (no cell size and position); 2-D coordinate "
+             "arrays and ground control points are not taken";
     return false;
   }
   const double* t = source->transform;
-  if (!(std::isfinite(t[0]) && std::isfinite(t[3])) ||
-      t[1] * t[5] - t[2] * t[4] == 0.0) {
+  if (!(std::isfinite(t[0]) && std::isfinite(t[3])) || t[1] * t[5] - t[2] * t[4] == 0.0) {
     *error = path + ": its georeferencing is degenerate (zero or non-finite cell size)";
     return false;
   }
@@ -226,9 +227,8 @@ bool openWithGdal(const std::string& path, const std::string& variable, SourceRa
     source->crs = cloneTraditional(crs);
   }
   source->position(0.5, source->height - 0.5, &source->southWestX, &source->southWestY);
-  source->what = driver + (chosen.empty() ? std::string() : " variable '" + chosen + "'") +
-                 ", " + std::to_string(source->width) + " x " +
-                 std::to_string(source->height) + " cells";
+  source->what = driver + (chosen.empty() ? std::string() : " variable '" + chosen + "'") + ", " +
+                 std::to_string(source->width) + " x " + std::to_string(source->height) + " cells";
   const int bands = GDALGetRasterCount(dataset.get());
   if (bands > 1) source->what += " (band 1 of " + std::to_string(bands) + ")";
   source->dataset = std::move(dataset);
@@ -248,8 +248,8 @@ bool SourceRaster::looksLikeDegrees() const {
   return true;
 }
 
-bool openSourceRaster(const std::string& path, const std::string& variable,
-                      SourceRaster* source, std::string* error) {
+bool openSourceRaster(const std::string& path, const std::string& variable, SourceRaster* source,
+                      std::string* error) {
   initGdal();
   *source = SourceRaster();
   if (isEsriAscii(path)) {

@@ -17,20 +17,19 @@ struct SourceRaster {
   int width = 0;
   int height = 0;
   double transform[6] = {0, 1, 0, 0, 0, -1};  // GDAL geotransform: pixel/line to x, y
-  Srs crs;                   // null when the file names none
+  Srs crs;                                    // null when the file names none
   bool hasNodata = false;
   double nodata = 0.0;
-  double scale = 1.0;        // stored value * scale + offset is the value
+  double scale = 1.0;  // stored value * scale + offset is the value
   double offset = 0.0;
   // Position of the south-west cell's centre; for ESRI ASCII grids exactly as
   // the header gives it (as this program has always placed those grids).
   double southWestX = 0.0;
   double southWestY = 0.0;
-  std::string what;          // driver, variable and size, for the summary line
+  std::string what;  // driver, variable and size, for the summary line
 
   bool northUp() const {
-    return transform[2] == 0.0 && transform[4] == 0.0 && transform[1] > 0.0 &&
-           transform[5] < 0.0;
+    return transform[2] == 0.0 && transform[4] == 0.0 && transform[1] > 0.0 && transform[5] < 0.0;
   }
   // x, y of the pixel/line position (p, l).
   void position(double p, double l, double* x, double* y) const {
@@ -46,8 +45,8 @@ struct SourceRaster {
 // variable; empty picks the only one there is. false and a message naming
 // the file when it is no raster, has no such variable, no georeferencing or
 // no cells.
-bool openSourceRaster(const std::string& path, const std::string& variable,
-                      SourceRaster* source, std::string* error);
+bool openSourceRaster(const std::string& path, const std::string& variable, SourceRaster* source,
+                      std::string* error);
 
 }  // namespace karnet::mkgrid
 

@@ -1,17 +1,15 @@
 // Where the grid lies: projection, spacing, extent and orientation.
 #include "mkgrid/target_grid.h"
 
-#include <cpl_conv.h>
 #include <strings.h>
 
 #include <algorithm>
 #include <cmath>
-#include <exception>
 #include <limits>
 #include <numbers>
 #include <vector>
 
-#include "input/cartography.h"
+#include "mkgrid/grid_projection.h"
 
 namespace karnet::mkgrid {
 namespace {
@@ -23,40 +21,6 @@ constexpr int kEdgeSteps = 32;              // points per side when outlining a 
 struct Point {
   double x, y;
 };
-
-std::string trimmed(const std::string& text) {
-  const std::size_t first = text.find_first_not_of(" \t\r\n");
-  if (first == std::string::npos) return std::string();
-  return text.substr(first, text.find_last_not_of(" \t\r\n") - first + 1);
-}
-
-std::string number(double value) {
-  char text[32];
-  std::snprintf(text, sizeof text, "%.10g", value);
-  return text;
-}
-
-std::string wktOf(OGRSpatialReferenceH srs) {
-  char* text = nullptr;
-  std::string wkt;
-  if (OSRExportToWkt(srs, &text) == OGRERR_NONE && text != nullptr) wkt = text;
-  CPLFree(text);
-  return wkt;
-}
-
-// karnet's own text for a projected CRS: UTM-<zone>[S] for WGS 84 / UTM,
-// EPSG:<code> for other EPSG CRSs, else its WKT.
-std::string projectionTextOf(OGRSpatialReferenceH crs) {
-  const char* authority = OSRGetAuthorityName(crs, nullptr);
-  const char* code = OSRGetAuthorityCode(crs, nullptr);
-  if (authority != nullptr && code != nullptr && strcasecmp(authority, "EPSG") == 0) {
-    const int n = std::atoi(code);
-    if (n > 32600 && n <= 32660) return "UTM-" + std::to_string(n - 32600);
-    if (n > 32700 && n <= 32760) return "UTM-" + std::to_string(n - 32700) + "S";
-    return std::string("EPSG:") + code;
-  }
-  return wktOf(crs);
-}
 
 // The outline of a box, kEdgeSteps points per side.
 std::vector<Point> boxOutline(double x0, double y0, double x1, double y1) {
@@ -104,44 +68,6 @@ double roundedLength(double value) {
   return std::floor(value / unit * (1.0 + 1e-12)) * unit;
 }
 
-// Longitude and latitude of the middle of the region (for --projection auto).
-bool regionCentre(const SourceRaster& source, OGRSpatialReferenceH crs,
-                  const MkgridOptions& options, double* longitude, double* latitude,
-                  std::string* error) {
-  if (options.extent == ExtentKind::Geographic) {
-    *longitude = (options.box[0] + options.box[2]) / 2.0;
-    *latitude = (options.box[1] + options.box[3]) / 2.0;
-    return true;
-  }
-  if (options.extent == ExtentKind::Projected) {
-    *error = "--projection auto cannot place --extent-proj (metres of which projection?): "
-             "give the projection itself, or the region with --extent in degrees";
-    return false;
-  }
-  if (crs == nullptr) {
-    *error = "--projection auto: " + options.input + " names no CRS; give it one with "
-             "--source-crs, or the region with --extent in degrees";
-    return false;
-  }
-  double x = 0.0, y = 0.0, z = 0.0;
-  source.position(source.width / 2.0, source.height / 2.0, &x, &y);
-  if (!OSRIsGeographic(crs)) {
-    Srs geographic(OSRCloneGeogCS(crs));
-    if (geographic) OSRSetAxisMappingStrategy(geographic.get(), OAMS_TRADITIONAL_GIS_ORDER);
-    CoordinateTransform toGeographic(
-        geographic ? OCTNewCoordinateTransformation(crs, geographic.get()) : nullptr);
-    int ok = 0;
-    if (!toGeographic || !OCTTransformEx(toGeographic.get(), 1, &x, &y, &z, &ok) || !ok) {
-      *error = "--projection auto: the middle of " + options.input +
-               " has no longitude and latitude";
-      return false;
-    }
-  }
-  *longitude = x;
-  *latitude = y;
-  return true;
-}
-
 // The region's frame bounds for a rotation: u along the grid's x axis, v along its y axis.
 struct FrameBox {
   double uMin, uMax, vMin, vMax;
@@ -172,13 +98,6 @@ bool nearWhole(double value) { return std::fabs(value - std::round(value)) < 1e-
 
 }  // namespace
 
-std::string utmZoneOf(double longitude, double latitude) {
-  double east = std::fmod(longitude + 180.0, 360.0);
-  if (east < 0.0) east += 360.0;
-  const int zone = std::min(60, static_cast<int>(std::floor(east / 6.0)) + 1);
-  return "UTM-" + std::to_string(zone) + (latitude < 0.0 ? "S" : "N");
-}
-
 void TargetGrid::geoTransform(double t[6]) const {
   const double c = std::cos(rotation * kDegree), s = std::sin(rotation * kDegree);
   // The north-west corner of the raster: half a cell west and south of the
@@ -191,81 +110,18 @@ void TargetGrid::geoTransform(double t[6]) const {
   t[5] = -dy * c;
 }
 
-bool planGrid(SourceRaster& source, const MkgridOptions& options, TargetGrid* grid,
+bool planGrid(const SourceRaster& source, const MkgridOptions& options, TargetGrid* grid,
               std::string* notes, std::string* error) {
   const std::string& input = options.input;
-  std::string message;
-  Srs crs;
-  if (!options.sourceCrs.empty()) {
-    crs = srsFromText(options.sourceCrs, &message);
-    if (!crs) {
-      *error = "--source-crs " + message;
-      return false;
-    }
-  } else {
-    crs = cloneTraditional(source.crs.get());
-  }
-
-  // The projection of the grid.
-  std::string projection = trimmed(options.projection);
-  const bool degrees = crs ? OSRIsGeographic(crs.get()) != 0 : source.looksLikeDegrees();
-  if (projection.empty()) {
-    if (crs && OSRIsProjected(crs.get())) {
-      projection = projectionTextOf(crs.get());
-    } else if (degrees) {
-      *error = input + ": its coordinates are longitude and latitude in degrees" +
-               (crs ? "" : " (it names no CRS, and they look like degrees)") +
-               "; karnet's grid is in metres: give its projection with --projection (auto "
-               "for the UTM zone of the region, UTM-32N, EPSG:<code>, ...)" +
-               (crs ? "" : ", or --projection LOCAL if the coordinates are plain metres");
-      return false;
-    } else if (crs) {
-      *error = input + ": its CRS is neither geographic nor projected; give --projection";
-      return false;
-    } else {
-      projection = "LOCAL";
-    }
-  }
-  const bool local = strcasecmp(projection.c_str(), "LOCAL") == 0;
-  if (!crs && !local && degrees) {
-    crs = srsFromText("EPSG:4326", &message);
-    *notes += "  " + input + " names no CRS; its coordinates are taken as WGS 84 longitude "
-              "and latitude (give --source-crs otherwise)\n";
-  }
-  if (local && crs) {
-    if (!OSRIsProjected(crs.get())) {
-      *error = "--projection LOCAL: " + input + " is in longitude and latitude; a LOCAL grid is "
-               "plain metres, so give a map projection (auto, UTM-<zone>, EPSG:<code>, ...)";
-      return false;
-    }
-    crs.reset();
-    *notes += "  LOCAL: the projected coordinates of " + input + " are taken as plain metres\n";
-  }
-  if (strcasecmp(projection.c_str(), "auto") == 0) {
-    double longitude = 0.0, latitude = 0.0;
-    if (!regionCentre(source, crs.get(), options, &longitude, &latitude, error)) return false;
-    projection = utmZoneOf(longitude, latitude);
-    *notes += "  projection auto: " + projection + " (the region's middle lies at " +
-              number(longitude) + ", " + number(latitude) + ")\n";
-  }
-  std::unique_ptr<Cartography> map;
-  try {
-    map = std::make_unique<Cartography>(projection, 0.0, 0.0, 0.0);
-  } catch (const std::exception& e) {
-    *error = "--projection '" + projection + "' is unusable: " + e.what();
-    return false;
-  }
+  GridProjection chosen;
+  if (!chooseProjection(source, options, &chosen, notes, error)) return false;
+  const std::string& projection = chosen.text;
+  const Cartography* map = chosen.map.get();
+  OGRSpatialReferenceH crs = chosen.sourceCrs.get();
+  OGRSpatialReferenceH target = chosen.targetCrs.get();
   const bool georeferenced = crs != nullptr;
-  Srs target;
-  bool reproject = false;
-  if (georeferenced) {
-    target = srsFromText(map->wkt(), &message);
-    if (!target) {
-      *error = "--projection '" + projection + "': GDAL cannot take it: " + message;
-      return false;
-    }
-    reproject = OSRIsSame(crs.get(), target.get()) == 0;
-  }
+  const bool reproject = chosen.reproject;
+  const bool local = strcasecmp(projection.c_str(), "LOCAL") == 0;
 
   // Options that only make sense for one kind of source.
   const bool originGiven = options.origin != OriginSource::Grid;
@@ -299,7 +155,7 @@ bool planGrid(SourceRaster& source, const MkgridOptions& options, TargetGrid* gr
   double resX = std::hypot(t[1], t[4]);
   double resY = std::hypot(t[2], t[5]);
   if (reproject) {
-    CoordinateTransform transform(OCTNewCoordinateTransformation(crs.get(), target.get()));
+    CoordinateTransform transform(OCTNewCoordinateTransformation(crs, target));
     if (!transform) {
       *error = input + ": no transformation from its CRS to " + projection + ": " +
                lastGdalError("PROJ has none");
@@ -326,8 +182,8 @@ bool planGrid(SourceRaster& source, const MkgridOptions& options, TargetGrid* gr
   if (!options.hasSpacing) {
     if (reproject) {
       dx = dy = roundedLength(std::min(resX, resY));
-      *notes += "  spacing " + number(dx) + " m (the source's cells are about " + number(resX) +
-                " x " + number(resY) + " m here; --spacing sets it)\n";
+      *notes += "  spacing " + numberText(dx) + " m (the source's cells are about " +
+                numberText(resX) + " x " + numberText(resY) + " m here; --spacing sets it)\n";
     } else {
       dx = resX;
       dy = resY;
@@ -385,11 +241,11 @@ bool planGrid(SourceRaster& source, const MkgridOptions& options, TargetGrid* gr
   const double nx = std::max(1.0, std::ceil(columns - 1e-6));
   const double ny = std::max(1.0, std::ceil(rows - 1e-6));
   if (!(columns <= kMaxNodes) || !(rows <= kMaxNodes) || nx * ny > kMaxNodes) {
-    const std::string spacing = options.hasSpacing ? "--spacing " + number(options.dx) + "," +
-                                                         number(options.dy)
-                                                   : "the source's cell size";
-    *error = spacing + " gives " + number(std::ceil(columns)) + " x " + number(std::ceil(rows)) +
-             " nodes over the region, more than 2147483647";
+    const std::string spacing =
+        options.hasSpacing ? "--spacing " + numberText(options.dx) + "," + numberText(options.dy)
+                           : "the source's cell size";
+    *error = spacing + " gives " + numberText(std::ceil(columns)) + " x " +
+             numberText(std::ceil(rows)) + " nodes over the region, more than 2147483647";
     return false;
   }
 
@@ -404,8 +260,8 @@ bool planGrid(SourceRaster& source, const MkgridOptions& options, TargetGrid* gr
   out.originY = origin.y;
 
   // Nodes on the source's cell centres are copied as they are.
-  if (!reproject && rotation == 0.0 && source.northUp() &&
-      std::fabs(dx - t[1]) <= 1e-6 * dx && std::fabs(dy + t[5]) <= 1e-6 * dy) {
+  if (!reproject && rotation == 0.0 && source.northUp() && std::fabs(dx - t[1]) <= 1e-6 * dx &&
+      std::fabs(dy + t[5]) <= 1e-6 * dy) {
     const double column = (origin.x - source.southWestX) / t[1];
     const double row = (origin.y - source.southWestY) / -t[5];
     if (nearWhole(column) && nearWhole(row)) {
@@ -423,8 +279,8 @@ bool planGrid(SourceRaster& source, const MkgridOptions& options, TargetGrid* gr
     out.method = coarser ? Resampling::Average : Resampling::Bilinear;
   }
   if (reproject) {
-    out.sourceWkt = wktOf(crs.get());
-    out.targetWkt = wktOf(target.get());
+    out.sourceWkt = wktOf(crs);
+    out.targetWkt = wktOf(target);
   }
 
   // The origin node on the earth, and the orientation.
@@ -440,8 +296,8 @@ bool planGrid(SourceRaster& source, const MkgridOptions& options, TargetGrid* gr
     *error = "the origin node lies outside the domain of the projection " + projection;
     return false;
   }
-  out.orientation = options.hasOrientation ? options.orientation
-                                           : map->convergence(out.longitude, out.latitude);
+  out.orientation =
+      options.hasOrientation ? options.orientation : map->convergence(out.longitude, out.latitude);
   if (!std::isfinite(out.orientation)) {
     *error = "the orientation is not a finite number";
     return false;
