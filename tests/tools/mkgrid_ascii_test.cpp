@@ -1,5 +1,7 @@
 // karnet-mkgrid on ESRI ASCII grids: the strict reader and the grids made from them as they are.
+#include <cpl_conv.h>
 #include <gtest/gtest.h>
+#include <ogr_srs_api.h>
 
 #include <sstream>
 #include <string>
@@ -132,6 +134,35 @@ TEST_F(MkgridProgram, ProjectedOriginGoesThroughTheProjection) {
   EXPECT_EQ(code, 1);
   EXPECT_NE(output.find("--projection 'NOT-A-PROJECTION' is unusable"), std::string::npos)
       << output;
+}
+
+// A .prj file beside the grid gives it a CRS: the grid's projection by
+// default, and then the origin follows from it alone.
+TEST_F(MkgridProgram, ProjectionFileBesideTheGridIsItsCrs) {
+  test::writeBytes(file("in.asc"),
+                   "ncols 2\nnrows 1\nxllcorner 600000\nyllcorner 6200000\ncellsize 100\n-3 -4\n");
+  OGRSpatialReferenceH srs = OSRNewSpatialReference(nullptr);
+  OSRImportFromEPSG(srs, 32633);
+  OSRMorphToESRI(srs);
+  char* wkt = nullptr;
+  OSRExportToWkt(srs, &wkt);
+  test::writeBytes(file("in.prj"), wkt);
+  CPLFree(wkt);
+  OSRRelease(srs);
+  int code = -1;
+  std::string output = runMkgrid(quoted(file("in.asc")) + " " + quoted(path), &code);
+  ASSERT_EQ(code, 0) << output;
+  const test::MadeGrid b = test::readMadeGrid(path);
+  EXPECT_EQ(b.projection, "UTM-33");
+  EXPECT_EQ(b.values, (std::vector<float>{-3, -4}));
+  test::NodePlacer nodes(b);
+  EXPECT_NEAR(nodes.x0, 600050.0, 1e-4);
+  EXPECT_NEAR(nodes.y0, 6200050.0, 1e-4);
+
+  output =
+      runMkgrid("--origin-geo 9,55 " + quoted(file("in.asc")) + " " + quoted(file("x.nc")), &code);
+  EXPECT_EQ(code, 1);
+  EXPECT_NE(output.find("is georeferenced"), std::string::npos) << output;
 }
 
 TEST_F(MkgridProgram, BadInputEndsWithCodeOneAndAMessage) {

@@ -20,13 +20,27 @@ std::string trimmed(const std::string& text) {
 // karnet's own text for a projected CRS: UTM-<zone>[S] for WGS 84 / UTM,
 // EPSG:<code> for other EPSG CRSs, else its WKT.
 std::string projectionTextOf(OGRSpatialReferenceH crs) {
-  const char* authority = OSRGetAuthorityName(crs, nullptr);
-  const char* code = OSRGetAuthorityCode(crs, nullptr);
+  // A CRS without its EPSG code (an ESRI .prj, say) may still be one of
+  // EPSG's; the code is taken only when its CRS is the same.
+  Srs identified(OSRClone(crs));
+  if (OSRGetAuthorityCode(identified.get(), nullptr) == nullptr) {
+    int count = 0;
+    int* confidence = nullptr;
+    OGRSpatialReferenceH* matches = OSRFindMatches(crs, nullptr, &count, &confidence);
+    if (count > 0 && confidence[0] >= 90) identified.reset(OSRClone(matches[0]));
+    if (matches != nullptr) OSRFreeSRSArray(matches);
+    CPLFree(confidence);
+  }
+  const char* authority = OSRGetAuthorityName(identified.get(), nullptr);
+  const char* code = OSRGetAuthorityCode(identified.get(), nullptr);
   if (authority != nullptr && code != nullptr && strcasecmp(authority, "EPSG") == 0) {
+    Srs registered(OSRNewSpatialReference(nullptr));
     const int n = std::atoi(code);
-    if (n > 32600 && n <= 32660) return "UTM-" + std::to_string(n - 32600);
-    if (n > 32700 && n <= 32760) return "UTM-" + std::to_string(n - 32700) + "S";
-    return std::string("EPSG:") + code;
+    if (OSRImportFromEPSG(registered.get(), n) == OGRERR_NONE && OSRIsSame(registered.get(), crs)) {
+      if (n > 32600 && n <= 32660) return "UTM-" + std::to_string(n - 32600);
+      if (n > 32700 && n <= 32760) return "UTM-" + std::to_string(n - 32700) + "S";
+      return std::string("EPSG:") + code;
+    }
   }
   return wktOf(crs);
 }
