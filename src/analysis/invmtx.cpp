@@ -6,13 +6,12 @@
 // operations, in the order the method states them: vectorised, each element
 // still sees exactly the same single-precision operations, so every width gives
 // the same bits. The same body is compiled once per instruction set (AVX-512,
-// AVX2, the baseline) and the widest one the processor runs is chosen once.
+// AVX2, the baseline); which one runs is decided once, from the processor.
 #include "analysis/invmtx.h"
 
 #include <bit>
 #include <cmath>
 #include <cstdint>
-#include <initializer_list>
 
 namespace karnet {
 namespace {
@@ -115,16 +114,20 @@ inline std::int32_t pivotKey(float value, std::int32_t notFree) {
       return -1;
     }
 
-    rowOf(pr)[pc] = 1.0f;
+    // The pivot entry becomes 1 before the exchange, and each eliminated row's
+    // entry in column pc becomes 0 before its update. Both are folded into the
+    // row loops as a choice per element (the same values in the same
+    // operations): a single-element store right before a loop that reads the
+    // row as vectors would stall the load.
     // Exchange rows pr and pc; the row that lands in pc is divided by p.
     float* rowB = rowOf(pc);
     if (pr == pc) {
-      for (std::int32_t q = 0; q < n; ++q) rowB[q] = rowB[q] / p;
+      for (std::int32_t q = 0; q < n; ++q) rowB[q] = (q == pc ? 1.0f : rowB[q]) / p;
     } else {
       float* __restrict rowA = rowOf(pr);
       float* __restrict target = rowB;
       for (std::int32_t q = 0; q < n; ++q) {
-        const float t = rowA[q];
+        const float t = q == pc ? 1.0f : rowA[q];
         rowA[q] = target[q];
         target[q] = t / p;
       }
@@ -136,8 +139,9 @@ inline std::int32_t pivotKey(float value, std::int32_t notFree) {
       if (r == pc) continue;
       float* __restrict row = rowOf(r);
       const float f = row[pc];
-      row[pc] = 0.0f;
-      for (std::int32_t q = 0; q < n; ++q) row[q] = row[q] - f * pivotRowValues[q];
+      for (std::int32_t q = 0; q < n; ++q) {
+        row[q] = (q == pc ? 0.0f : row[q]) - f * pivotRowValues[q];
+      }
     }
   }
 
@@ -200,11 +204,24 @@ InvertFunction variantFunction(InvmtxVariant variant) {
   }
 }
 
-InvertFunction widestVariant() {
-  for (InvmtxVariant v : {InvmtxVariant::kAvx512, InvmtxVariant::kAvx2}) {
-    if (InvertFunction f = variantFunction(v)) return f;
+// The variant for blocks of up to kShortRows rows, and the one for larger
+// blocks. 512-bit rows only pay once they are long: on short ones the partial
+// vector at the end of each row costs more than the wider body saves.
+constexpr std::int32_t kShortRows = 32;
+
+struct Chosen {
+  InvertFunction shortRows = invertBaseline;
+  InvertFunction longRows = invertBaseline;
+};
+
+Chosen chooseVariants() {
+  Chosen chosen;
+  if (InvertFunction f = variantFunction(InvmtxVariant::kAvx2)) {
+    chosen.shortRows = f;
+    chosen.longRows = f;
   }
-  return invertBaseline;
+  if (InvertFunction f = variantFunction(InvmtxVariant::kAvx512)) chosen.longRows = f;
+  return chosen;
 }
 
 }  // namespace
@@ -238,8 +255,8 @@ const char* invmtxVariantName(InvmtxVariant variant) {
 }
 
 std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
-  static const InvertFunction chosen = widestVariant();
-  return chosen(ws, a, n, det);
+  static const Chosen chosen = chooseVariants();
+  return (n > kShortRows ? chosen.longRows : chosen.shortRows)(ws, a, n, det);
 }
 
 std::int32_t invmtxWith(InvmtxVariant variant, OaWorkspace& ws, float* a, std::int32_t n,

@@ -19,7 +19,7 @@ namespace karnet {
 // success. det receives the determinant. The pivot records live in ws.pivot: entry c
 // is the row in which column c's pivot was found, entry n + s the pivot column
 // of step s.
-// Runs the widest compiled variant that the processor supports.
+// Runs the compiled variant that suits n best among those the processor supports.
 std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det);
 
 // The compiled variants of INVMTX, one per instruction set; all give the same

@@ -199,7 +199,9 @@ std::vector<float> randomBlock(std::mt19937& random, int n, int limit, int kind)
     volatile float zero = 0.0f;
     const float specials[] = {std::numeric_limits<float>::infinity(),
                               -std::numeric_limits<float>::infinity(), zero / zero, -0.0f};
-    for (int i = 0; i < 1 + n / 8; ++i) at(index(random), index(random)) = specials[pick(random) % 4];
+    for (int i = 0; i < 1 + n / 8; ++i) {
+      at(index(random), index(random)) = specials[pick(random) % 4];
+    }
   }
   return a;
 }
