@@ -34,6 +34,24 @@ std::int64_t reachInNodes(float r2) {
   return o;
 }
 
+// rowReach[o] for o = 0 .. count - 1: the largest row offset d for which a
+// cell o columns and d rows from the node passes the radius test, whose float
+// arithmetic (whole-node offsets, exact squares) rises with d; -1 when none
+// does. The radius is bounded here (reachInNodes is below kUnbounded), so
+// every offset stays exact as a float.
+void fillRowReach(std::int32_t* rowReach, std::int64_t count, float r2) {
+  auto passes = [r2](std::int64_t o, std::int64_t d) {
+    const auto fo = static_cast<float>(o);
+    const auto fd = static_cast<float>(d);
+    return !(fd * fd + fo * fo > r2);
+  };
+  std::int64_t d = reachInNodes(r2);
+  for (std::int64_t o = 0; o < count; ++o) {
+    while (d >= 0 && !passes(o, d)) --d;
+    rowReach[o] = static_cast<std::int32_t>(d);
+  }
+}
+
 // Appends data cell i as a candidate of node (nodeX, nodeY) when it lies within
 // the search radius.
 inline void consider(OaWorkspace& ws, std::int32_t i, float nodeX, float nodeY, float radius2,
@@ -88,23 +106,42 @@ std::int32_t selectData(OaWorkspace& ws, std::int32_t j, std::int32_t k,
     // rows, that the radius can reach are visited, in collection order. Cells
     // outside that window would fail the radius test anyway.
     const std::int32_t nj = ws.columnCount;
-    const std::int64_t reach = reachInNodes(radius2);
+    const bool sameRadius = ws.rowReachCount != 0 && ws.rowReachRadius2 == radius2;
+    const std::int64_t reach = sameRadius ? ws.rowReachNodes : reachInNodes(radius2);
     const std::int64_t xFirst = std::max<std::int64_t>(std::int64_t{j} - reach, 0);
     const std::int64_t xLast = std::min<std::int64_t>(std::int64_t{j} + reach, nj - 1);
-    const bool windowY = reach < kUnbounded;
-    const double yFirst = static_cast<double>(std::int64_t{k} - reach);
-    const double yLast = static_cast<double>(std::int64_t{k} + reach);
-    for (std::int64_t x = xFirst; x <= xLast; ++x) {
-      std::int32_t i = ws.columnStart[x];
-      const std::int32_t end = ws.columnStart[x + 1];
-      if (windowY) {
-        const float* first = std::lower_bound(
-            ws.dataY + i, ws.dataY + end, yFirst,
-            [](float y, double bound) { return static_cast<double>(y) < bound; });
-        i = static_cast<std::int32_t>(first - ws.dataY);
+    if (reach >= kUnbounded) {
+      for (std::int64_t x = xFirst; x <= xLast; ++x) {
+        for (std::int32_t i = ws.columnStart[x]; i < ws.columnStart[x + 1]; ++i) {
+          consider(ws, i, nodeX, nodeY, radius2, count);
+        }
       }
-      for (; i < end && !(windowY && static_cast<double>(ws.dataY[i]) > yLast); ++i) {
-        consider(ws, i, nodeX, nodeY, radius2, count);
+    } else if (xFirst <= xLast) {
+      std::int32_t* rowReach = ws.rowReach;
+      if (!sameRadius) {
+        const std::int64_t offsets = std::min<std::int64_t>(reach + 1, nj);
+        fillRowReach(rowReach, offsets, radius2);
+        ws.rowReachCount = static_cast<std::int32_t>(offsets);
+        ws.rowReachRadius2 = radius2;
+        ws.rowReachNodes = reach;
+      }
+      // The cursors stand at each column's first cell at or above the window
+      // of an earlier node of this column (same radius, so the same columns);
+      // a later node's window starts no lower, so they only move up.
+      const bool resume = sameRadius && ws.cursorJ == j && ws.cursorK <= k;
+      ws.cursorJ = j;
+      ws.cursorK = k;
+      for (std::int64_t x = xFirst; x <= xLast; ++x) {
+        const std::int64_t rows = rowReach[x < j ? j - x : x - j];
+        const double yFirst = static_cast<double>(std::int64_t{k} - rows);
+        const double yLast = static_cast<double>(std::int64_t{k} + rows);
+        const std::int32_t end = ws.columnStart[x + 1];
+        std::int32_t i = resume ? ws.columnCursor[x] : ws.columnStart[x];
+        while (i < end && static_cast<double>(ws.dataY[i]) < yFirst) ++i;
+        ws.columnCursor[x] = i;
+        for (; i < end && !(static_cast<double>(ws.dataY[i]) > yLast); ++i) {
+          consider(ws, i, nodeX, nodeY, radius2, count);
+        }
       }
     }
   } else {

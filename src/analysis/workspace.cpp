@@ -85,12 +85,20 @@ void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::i
 
   ws.columnCount = 0;
   ws.columnStart = nullptr;
+  ws.columnCursor = nullptr;
+  ws.cursorJ = -1;
+  ws.rowReach = nullptr;
+  ws.rowReachCount = 0;
   ws.errorText = "";
 }
 
 void workspaceIndexColumns(OaWorkspace& ws, std::int32_t nj) {
   release(ws.columnStart);
+  release(ws.columnCursor);
+  release(ws.rowReach);
   ws.columnCount = 0;
+  ws.cursorJ = -1;
+  ws.rowReachCount = 0;
   // Positions must stay exact as floats for the column window of the selection.
   if (nj < 1 || nj >= (1 << 24)) return;
 
@@ -114,6 +122,8 @@ void workspaceIndexColumns(OaWorkspace& ws, std::int32_t nj) {
     while (i < ws.dataCount && ws.dataX[i] == static_cast<float>(x)) ++i;
   }
   ws.columnStart[nj] = i;
+  ws.columnCursor = allocateEntries<std::int32_t>(nj);
+  ws.rowReach = allocateEntries<std::int32_t>(nj);
   ws.columnCount = nj;
 }
 
@@ -132,6 +142,10 @@ void workspaceRelease(OaWorkspace& ws) {
   release(ws.pivot);
   release(ws.corrTable);
   release(ws.columnStart);
+  release(ws.columnCursor);
+  release(ws.rowReach);
+  ws.cursorJ = -1;
+  ws.rowReachCount = 0;
   ws.dataCapacity = 0;
   ws.dataCount = 0;
   ws.lineCapacity = 0;
