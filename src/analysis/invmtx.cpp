@@ -164,7 +164,10 @@ inline std::int32_t pivotKey(float value, std::int32_t notFree) {
     det = static_cast<float>(scale);
     return -1;
   }
-  det = static_cast<float>(static_cast<double>(det) * std::pow(10.0, scale));
+  // pow(10, 0) is exactly 1 by definition; the usual unscaled determinant
+  // spares the call.
+  const double power = scale == 0 ? 1.0 : std::pow(10.0, scale);
+  det = static_cast<float>(static_cast<double>(det) * power);
   if (static_cast<double>(det) < 1e-4) ws.errorText = "Determinant very small in INVMTX";
   return 0;
 }
