@@ -2,6 +2,7 @@
 #include "analysis/select_data.h"
 
 #include <algorithm>
+#include <bit>
 #include <cmath>
 
 #include "analysis/correlation.h"
@@ -63,6 +64,37 @@ inline void consider(OaWorkspace& ws, std::int32_t i, float nodeX, float nodeY, 
   ws.candIndex[count] = i;
   ws.candCorr[count] = tabledCorrelation(d2, ws);
   ++count;
+}
+
+// The exchange sort of sortByCorrelation on one array of 64-bit keys instead
+// of two arrays: the high half is an integer image of the correlation that
+// orders as the floats do (both zeros alike), the low half the candidate's
+// position, which the comparisons leave out. The same comparisons in the same
+// order make the same moves. Returns false, sorting nothing, when a
+// correlation is not a number (which no integer image orders like a float).
+bool sortByKey(OaWorkspace& ws, std::int32_t n) {
+  std::uint64_t* key = ws.candKey;
+  for (std::int32_t i = 0; i < n; ++i) {
+    const float c = ws.candCorr[i];
+    if (c != c) return false;
+    const auto bits = std::bit_cast<std::uint32_t>(c == 0.0f ? 0.0f : c);
+    const std::uint32_t image = bits & 0x80000000u ? ~bits : bits | 0x80000000u;
+    key[i] = (std::uint64_t{image} << 32) | static_cast<std::uint32_t>(i);
+  }
+  constexpr std::uint64_t kHigh = 0xffffffff00000000u;
+  for (std::int32_t gap = n / 2; gap >= 1; gap /= 2) {
+    for (std::int32_t i = gap; i < n; ++i) {
+      const std::uint64_t moving = key[i];
+      const std::uint64_t bound = moving & kHigh;  // below it: a smaller correlation
+      std::int32_t p = i;
+      while (p >= gap && key[p - gap] < bound) {
+        key[p] = key[p - gap];
+        p -= gap;
+      }
+      key[p] = moving;
+    }
+  }
+  return true;
 }
 
 }  // namespace
@@ -152,8 +184,21 @@ std::int32_t selectData(OaWorkspace& ws, std::int32_t j, std::int32_t k,
 
   std::int32_t kept = count;
   if (count > ws.limit) {
-    sortByCorrelation(ws.candCorr, ws.candIndex, count);
     kept = ws.limit > 0 ? ws.limit : 0;
+    if (sortByKey(ws, count)) {
+      // Candidate p of the sorted order is the one first found at position
+      // candKey[p]'s low half.
+      for (std::int32_t p = 0; p < kept; ++p) {
+        const auto from = static_cast<std::int32_t>(ws.candKey[p] & 0xffffffffu);
+        const std::int32_t i = ws.candIndex[from];
+        ws.selX[p] = ws.dataX[i];
+        ws.selY[p] = ws.dataY[i];
+        ws.selValue[p] = ws.dataValue[i];
+        ws.selCorr[p] = ws.candCorr[from];
+      }
+      return kept;
+    }
+    sortByCorrelation(ws.candCorr, ws.candIndex, count);
   }
   for (std::int32_t p = 0; p < kept; ++p) {
     const std::int32_t i = ws.candIndex[p];

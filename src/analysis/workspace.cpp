@@ -61,6 +61,7 @@ void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::i
   ws.dataValue = allocateEntries<float>(data);
   ws.candIndex = allocateEntries<std::int32_t>(data);
   ws.candCorr = allocateEntries<float>(data);
+  ws.candKey = allocateEntries<std::uint64_t>(data);
 
   ws.selX = allocateEntries<float>(limit);
   ws.selY = allocateEntries<float>(limit);
@@ -133,6 +134,7 @@ void workspaceRelease(OaWorkspace& ws) {
   release(ws.dataValue);
   release(ws.candIndex);
   release(ws.candCorr);
+  release(ws.candKey);
   release(ws.selX);
   release(ws.selY);
   release(ws.selValue);

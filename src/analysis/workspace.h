@@ -29,6 +29,9 @@ struct OaWorkspace {
   // Candidates of the node being estimated and their correlation with it.
   std::int32_t* candIndex = nullptr;
   float* candCorr = nullptr;
+  // Sort keys of the candidates (an integer image of the correlation above the
+  // candidate's position), one entry per data cell.
+  std::uint64_t* candKey = nullptr;
 
   // The cells chosen for the node (limit entries each).
   float* selX = nullptr;
