@@ -62,7 +62,7 @@ for name in "${cases[@]}"; do
         best=$wall bestUser=$user bestPeak=$peak
       fi
     done
-    rate=$(awk -v n="${nodes[$name]}" -v s="$best" 'BEGIN {printf "%.2f", n / s / 1e6}')
+    rate=$(awk -v n="${nodes[$name]}" -v s="$best" 'BEGIN {printf "%.3f", n / s / 1e6}')
     printf "%-15s %7s %9s %9s %12s %10s\n" "$name" "$n" "$best" "$bestUser" "$rate" "$bestPeak"
     [ "$n" != "$threads" ] || break
   done
