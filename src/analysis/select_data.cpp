@@ -168,7 +168,13 @@ std::int32_t selectData(OaWorkspace& ws, std::int32_t j, std::int32_t k,
         const double yFirst = static_cast<double>(std::int64_t{k} - rows);
         const double yLast = static_cast<double>(std::int64_t{k} + rows);
         const std::int32_t end = ws.columnStart[x + 1];
-        std::int32_t i = resume ? ws.columnCursor[x] : ws.columnStart[x];
+        std::int32_t i = ws.columnCursor[x];
+        if (!resume) {
+          const float* first = std::lower_bound(
+              ws.dataY + ws.columnStart[x], ws.dataY + end, yFirst,
+              [](float y, double bound) { return static_cast<double>(y) < bound; });
+          i = static_cast<std::int32_t>(first - ws.dataY);
+        }
         while (i < end && static_cast<double>(ws.dataY[i]) < yFirst) ++i;
         ws.columnCursor[x] = i;
         for (; i < end && !(static_cast<double>(ws.dataY[i]) > yLast); ++i) {
