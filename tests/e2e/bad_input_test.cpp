@@ -89,6 +89,7 @@ struct BadInput {
   std::string logText;  // expected in the log ("" for none)
   bool writesResult = false;
   bool emptyResult = false;  // every node of the result holds the fill value
+  bool notAsRoot = false;    // permissions do not bind root
 };
 
 using P = ParameterFile&;
@@ -340,6 +341,13 @@ std::vector<BadInput> outputRows() {
   return {
       {"output directory missing", [](P p) { p.outputFileName = "|nowhere/result.nc|"; }, {}, 1,
        "ERROR while writing result file"},
+      {"read-only output directory", [](P p) { p.outputFileName = "|locked/result.nc|"; },
+       [](D d) {
+         fs::create_directory(d.file("locked"));
+         writeFile(d.file("locked/result.nc"), kEarlierResult);
+         fs::permissions(d.file("locked"), fs::perms::owner_read | fs::perms::owner_exec);
+       },
+       1, "ERROR while writing result file", false, false, true},
       {"output path is a directory", [](P p) { p.outputFileName = "|out|"; },
        [](D d) { fs::create_directory(d.file("out")); }, 1, "ERROR while writing result file"},
       {"output path ends in a slash", [](P p) { p.outputFileName = "|out/|"; }, {}, 1,
@@ -376,6 +384,7 @@ std::map<std::string, std::string> snapshot(const TempDir& dir) {
 
 void runRow(const BadInput& row) {
   SCOPED_TRACE(row.name);
+  if (row.notAsRoot && geteuid() == 0) return;
   TempDir dir;
   ParameterFile p;
   p.projection = "'LOCAL'";
