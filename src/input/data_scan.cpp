@@ -1,6 +1,5 @@
 #include "input/data_scan.h"
 
-#include <cerrno>
 #include <cmath>
 #include <cstdio>
 #include <algorithm>

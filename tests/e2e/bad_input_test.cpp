@@ -261,6 +261,14 @@ std::vector<BadInput> bathymetryRows() {
          writeFile(d.file("bathymetry.nc"), bytes.substr(0, bytes.size() / 2));
        },
        1, unread},
+      // A 613-byte classic file whose header declares an attribute of 6.7 GB.
+      {"bathymetry declaring gigabytes", {},
+       [](D d) {
+         fs::copy_file(std::string(KARNET_SOURCE_DIR) +
+                           "/tests/fuzz/regressions/bathymetry_huge_attribute.nc",
+                       d.file("bathymetry.nc"), fs::copy_options::overwrite_existing);
+       },
+       1, unread},
       {"text as bathymetry", {}, [](D d) { writeFile(d.file("bathymetry.nc"), "CDF\x01 garbage"); },
        1, unread},
       {"empty bathymetry file", {}, [](D d) { writeFile(d.file("bathymetry.nc"), ""); }, 1, unread},
