@@ -209,10 +209,12 @@ TEST(ResultSafety, FiveMillionObservationLinesAreRead) {
   }
   const auto start = std::chrono::steady_clock::now();
   const ProcessResult many = runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}});
-  const double seconds =
+  [[maybe_unused]] const double seconds =
       std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
   ASSERT_EQ(many.exitCode, 0) << readFile(dir.file("case.log"));
-  EXPECT_LT(seconds, 60.0);
+#ifndef KARNET_SANITIZED
+  EXPECT_LT(seconds, 60.0);  // about 3 s on a quiet machine: nothing grows with the line count squared
+#endif
   int shape[3];
   const std::vector<float> manyValues = readResult(dir.file("result.nc"), nullptr, shape);
 
