@@ -1,6 +1,7 @@
 #include "gridfile/classic_header.h"
 
 #include <cstring>
+#include <vector>
 
 namespace karnet {
 namespace {
@@ -130,26 +131,52 @@ ClassicHeader checkClassicHeader(std::FILE* stream, std::uint64_t fileSize) {
   HeaderReader r(stream, fileSize - 4, version);
   std::uint64_t records = 0, n = 0;
   if (!r.count(&records)) return ClassicHeader::kBroken;
-  // Dimensions: name and length.
+  // Dimensions: name and length (0 for the record dimension).
   if (!listHeader(r, kTagDimension, 2 * r.countSize() + 4, &n)) return ClassicHeader::kBroken;
-  for (std::uint64_t i = 0; i < n; ++i) {
-    std::uint64_t length = 0;
+  std::vector<std::uint64_t> lengths(static_cast<std::size_t>(n));
+  for (std::uint64_t& length : lengths) {
     if (!r.name() || !r.count(&length)) return ClassicHeader::kBroken;
   }
   if (!attributes(r, version)) return ClassicHeader::kBroken;
   // Variables: name, dimension ids, attributes, type, size and offset.
   if (!listHeader(r, kTagVariable, 5 * r.countSize() + 12, &n)) return ClassicHeader::kBroken;
+  const bool streaming = records == (version == 5 ? UINT64_MAX : std::uint64_t{0xFFFFFFFF});
   for (std::uint64_t i = 0; i < n; ++i) {
     std::uint64_t rank = 0;
-    if (!r.name() || !r.count(&rank) || rank > r.left() / r.countSize() ||
-        !r.skipPadded(rank * r.countSize()) || !attributes(r, version)) {
+    if (!r.name() || !r.count(&rank) || rank > r.left() / r.countSize()) {
       return ClassicHeader::kBroken;
     }
+    std::vector<std::uint64_t> shape;
+    bool isRecord = false;
+    for (std::uint64_t d = 0; d < rank; ++d) {
+      std::uint64_t id = 0;
+      if (!r.count(&id) || id >= lengths.size()) return ClassicHeader::kBroken;
+      if (lengths[id] == 0 && d == 0) {
+        isRecord = true;
+      } else {
+        shape.push_back(lengths[id]);
+      }
+    }
+    if (!attributes(r, version)) return ClassicHeader::kBroken;
     std::uint32_t type = 0;
     std::uint64_t size = 0, begin = 0;
     if (!r.u32(&type) || typeSize(type, version) == 0 || !r.count(&size) || !r.offset(&begin)) {
       return ClassicHeader::kBroken;
     }
+    // The values of a gridded item (two or more dimensions) must lie in the
+    // file: a cut file would otherwise read as zeros. For a record variable
+    // numrecs times one record's values is a lower bound of where it ends.
+    if (rank < 2 || (isRecord && streaming)) continue;
+    std::uint64_t bytes = typeSize(type, version);
+    for (std::uint64_t length : shape) {
+      if (length != 0 && bytes > fileSize / length) return ClassicHeader::kBroken;
+      bytes *= length;
+    }
+    if (isRecord) {
+      if (records != 0 && bytes > fileSize / records) return ClassicHeader::kBroken;
+      bytes *= records;
+    }
+    if (begin > fileSize || bytes > fileSize - begin) return ClassicHeader::kBroken;
   }
   return ClassicHeader::kSound;
 }

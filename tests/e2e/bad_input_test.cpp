@@ -269,6 +269,16 @@ std::vector<BadInput> bathymetryRows() {
                        d.file("bathymetry.nc"), fs::copy_options::overwrite_existing);
        },
        1, unread},
+      // The header is whole, the last heights are missing: they must not read as zeros.
+      {"classic bathymetry cut in its values", {},
+       [](D d) {
+         ncgen(d.file("bathymetry.nc"),
+               typedBathymetry("float", "-5, -10, -12, -9, -7, -20, -25, -4, -3, -8, -6, -2"),
+               "classic");
+         const std::string bytes = readFile(d.file("bathymetry.nc"));
+         writeFile(d.file("bathymetry.nc"), bytes.substr(0, bytes.size() - 8));
+       },
+       1, unread},
       {"text as bathymetry", {}, [](D d) { writeFile(d.file("bathymetry.nc"), "CDF\x01 garbage"); },
        1, unread},
       {"empty bathymetry file", {}, [](D d) { writeFile(d.file("bathymetry.nc"), ""); }, 1, unread},

@@ -89,6 +89,25 @@ TEST_F(ClassicHeaderTest, ACutHeaderIsBrokenUntilItIsWhole) {
   }
 }
 
+// A cut file whose header is whole: the values that are missing would read as zeros.
+TEST_F(ClassicHeaderTest, GriddedValuesMustLieInTheFile) {
+  const std::string cdl =
+      "netcdf g {\ndimensions:\n  t = UNLIMITED ;\n  y = 3 ;\n  x = 4 ;\nvariables:\n"
+      "  double x(x) ;\n  float depth(y, x) ;\n  short series(t, x) ;\n"
+      "data:\n x = 0, 1, 2, 3 ;\n depth = 1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 11, 12 ;\n"
+      " series = 1, 2, 3, 4, 5, 6, 7, 8 ;\n}\n";
+  for (const std::string kind : {"classic", "64-bit-offset", "cdf5"}) {
+    SCOPED_TRACE(kind);
+    const std::string bytes = made(kind, cdl);
+    EXPECT_EQ(check(bytes), ClassicHeader::kSound);
+    // The last values are those of the record variable (two records of 4 shorts).
+    EXPECT_EQ(check(bytes.substr(0, bytes.size() - 8)), ClassicHeader::kBroken);
+    const std::size_t depthEnd = bytes.size() - 16;  // records follow the 48 bytes of depth
+    EXPECT_EQ(check(bytes.substr(0, depthEnd - 4)), ClassicHeader::kBroken);
+    EXPECT_EQ(check(bytes.substr(0, depthEnd - 48)), ClassicHeader::kBroken);
+  }
+}
+
 // What fuzzing found: one changed byte in an attribute's value count of a
 // 613-byte file declared 6.7 GB, which the library then allocated and converted.
 TEST_F(ClassicHeaderTest, DeclaredSizesBeyondTheFileAreBroken) {
