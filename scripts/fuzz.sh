@@ -1,18 +1,19 @@
 #!/usr/bin/env bash
 # Builds the libFuzzer harnesses of tests/fuzz with clang, AddressSanitizer and
 # UndefinedBehaviorSanitizer (in build-fuzz/) and runs each one.
-#   scripts/fuzz.sh [SECONDS] [HARNESS...]   SECONDS per harness (default 30); all harnesses
-#                                             unless some are named
+#   scripts/fuzz.sh [SECONDS] [HARNESS...]   SECONDS per harness (default $FUZZ_SECONDS, else
+#                                             20: the seven harnesses take about 2.5 minutes);
+#                                             all harnesses unless some are named
 #   FUZZ_RUNS=N scripts/fuzz.sh              stops each harness after N inputs instead
 # New inputs go to build-fuzz/corpus/<harness>/ (the seeds in tests/fuzz/corpus/ stay as
 # they are); an input that fails is saved in build-fuzz/artifacts/ and the script exits 1.
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
-seconds=${1:-30}
+seconds=${1:-${FUZZ_SECONDS:-20}}
 shift || true
 harnesses=("$@")
-[ ${#harnesses[@]} -gt 0 ] || harnesses=(parameter_file observation_lines bathymetry)
+[ ${#harnesses[@]} -gt 0 ] || harnesses=(parameter_file observation_lines bathymetry esri_ascii source_raster obs_table argo)
 jobs=$(nproc 2>/dev/null || echo 2)
 
 CC=clang CXX=clang++ cmake -S . -B build-fuzz -DCMAKE_BUILD_TYPE=RelWithDebInfo \
@@ -28,6 +29,10 @@ for h in "${harnesses[@]}"; do
     parameter_file) max_len=16384 ;;
     observation_lines) max_len=8192 ;;
     bathymetry) max_len=65536 ;;
+    esri_ascii) max_len=8192 ;;
+    source_raster) max_len=65536 ;;
+    obs_table) max_len=8192 ;;
+    argo) max_len=65536 ;;
     *) echo "fuzz.sh: unknown harness $h" >&2; exit 2 ;;
   esac
   mkdir -p "build-fuzz/corpus/$h"

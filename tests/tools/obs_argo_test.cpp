@@ -1,6 +1,8 @@
 // karnet-obs: Argo profile files.
 #include <gtest/gtest.h>
 
+#include <cstdint>
+#include <cstdio>
 #include <string>
 #include <vector>
 
@@ -163,6 +165,56 @@ variables: double LATITUDE(N_PROF) ; double LONGITUDE(N_PROF) ; double PRES(N_PR
             std::string::npos);
   EXPECT_NE(errorOf(dir.file("absent.nc")).find("absent.nc: cannot read as NetCDF"),
             std::string::npos);
+}
+
+// Overwrites the four bytes at offset with a big-endian count.
+void patchCount(const std::string& path, long offset, std::uint32_t count) {
+  std::FILE* f = std::fopen(path.c_str(), "r+b");
+  ASSERT_NE(f, nullptr);
+  const unsigned char bytes[4] = {static_cast<unsigned char>(count >> 24),
+                                  static_cast<unsigned char>(count >> 16),
+                                  static_cast<unsigned char>(count >> 8),
+                                  static_cast<unsigned char>(count)};
+  ASSERT_EQ(std::fseek(f, offset, SEEK_SET), 0);
+  ASSERT_EQ(std::fwrite(bytes, 1, 4, f), 4u);
+  std::fclose(f);
+}
+
+// A classic file of a few hundred bytes whose header declares billions of values is refused
+// before anything is allocated for them, whichever variable would hold them.
+TEST(ObsArgo, HeadersDeclaringMoreThanTheFileHoldsAreRefused) {
+  const TempDir dir;
+  const char* cdl = R"(netcdf p {
+dimensions: N_PROF = 2 ; N_LEVELS = 1 ;
+variables: double LATITUDE(N_PROF) ; double LONGITUDE(N_PROF) ; double PRES(N_PROF, N_LEVELS) ;
+  double TEMP(N_PROF, N_LEVELS) ;
+data: LATITUDE = 1, 2 ; LONGITUDE = 3, 4 ; PRES = 5, 6 ; TEMP = 7, 8 ;
+})";
+  // N_PROF's length: after the magic, numrecs, the dimension tag and count, and the name
+  // "N_PROF" (length and 8 padded bytes).
+  constexpr long kProfLength = 4 + 4 + 4 + 4 + 4 + 8;
+  const std::string sound = ncgenFile(dir, "sound.nc", cdl);
+  EXPECT_EQ(readFile(sound).rows.size(), 2u);
+
+  // Only the 1-D variables on N_PROF declare more than the file holds (N_LEVELS = 0 would make
+  // it the record dimension, so PRES keeps its length through a 2-D shape of 1 level).
+  const std::string profiles = ncgenFile(dir, "profiles.nc", cdl);
+  patchCount(profiles, kProfLength, 0x7FFFFFFFu);
+  const std::string message = errorOf(profiles);
+  EXPECT_NE(message.find("profiles.nc: "), std::string::npos) << message;
+  EXPECT_NE(message.find("more than the file holds"), std::string::npos) << message;
+
+  // A record dimension whose count is far beyond the file.
+  const std::string records = ncgenFile(dir, "records.nc", R"(netcdf r {
+dimensions: N_PROF = UNLIMITED ; N_LEVELS = 1 ;
+variables: double LATITUDE(N_PROF) ; double LONGITUDE(N_PROF) ; double PRES(N_PROF, N_LEVELS) ;
+  double TEMP(N_PROF, N_LEVELS) ;
+data: LATITUDE = 1 ; LONGITUDE = 3 ; PRES = 5 ; TEMP = 7 ;
+})");
+  patchCount(records, 4, 0x7FFFFFF0u);
+  const std::string recordMessage = errorOf(records);
+  EXPECT_NE(recordMessage.find("records.nc: "), std::string::npos) << recordMessage;
+  EXPECT_NE(recordMessage.find("more than the file holds"), std::string::npos) << recordMessage;
 }
 
 }  // namespace

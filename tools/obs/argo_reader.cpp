@@ -6,20 +6,44 @@
 
 #include <charconv>
 #include <cmath>
+#include <cstdint>
 #include <cstdio>
 #include <cstring>
 #include <fstream>
 #include <vector>
 
+#include "gridfile/classic_header.h"
 #include "obs/iso_time.h"
 
 namespace karnet::obs {
 
 namespace {
 
+// Size of the file in the classic NetCDF formats, after a look at its header: the NetCDF library
+// allocates whatever a classic header declares before reading it, so a header that declares
+// more than the file holds is refused here. 0 for other formats (netCDF-4/HDF5).
+std::uint64_t checkedClassicSize(const std::string& path) {
+  std::FILE* stream = std::fopen(path.c_str(), "rb");
+  if (stream == nullptr) return 0;  // nc_open names the fault
+  std::uint64_t size = 0;
+  ClassicHeader header = ClassicHeader::kNotClassic;
+  if (std::fseek(stream, 0, SEEK_END) == 0) {
+    const long end = std::ftell(stream);
+    if (end > 0) {
+      size = static_cast<std::uint64_t>(end);
+      header = checkClassicHeader(stream, size);
+    }
+  }
+  std::fclose(stream);
+  if (header == ClassicHeader::kBroken) {
+    throw ObsError(path + ": cannot read as NetCDF: its header declares more than the file holds");
+  }
+  return header == ClassicHeader::kSound ? size : 0;
+}
+
 class NcFile {
  public:
-  explicit NcFile(const std::string& path) : path_(path) {
+  explicit NcFile(const std::string& path) : path_(path), classicSize_(checkedClassicSize(path)) {
     const int status = nc_open(path.c_str(), NC_NOWRITE, &id_);
     if (status != NC_NOERR) {
       throw ObsError(path + ": cannot read as NetCDF: " + nc_strerror(status));
@@ -67,9 +91,13 @@ class NcFile {
 
   int id() const { return id_; }
   const std::string& path() const { return path_; }
+  // The file's size when it is in a classic format (every value declared there takes at least
+  // one byte of it), else 0.
+  std::uint64_t classicSize() const { return classicSize_; }
 
  private:
   std::string path_;
+  std::uint64_t classicSize_ = 0;
   int id_ = -1;
 };
 
@@ -171,7 +199,18 @@ void readArgo(const std::string& path, const ReadOptions& options, const RowSink
   const std::size_t nLevels = file.dimension("N_LEVELS", &levelDim);
   const std::vector<int> perProfile{profDim};
   const std::vector<int> perLevel{profDim, levelDim};
+  // A header's dimensions are checked before anything is allocated for them: their product
+  // must not wrap around, and a classic file holds every value it declares.
+  if (nProf > SIZE_MAX / sizeof(double) ||
+      (nLevels != 0 && nProf > SIZE_MAX / sizeof(double) / nLevels)) {
+    throw ObsError(path + ": N_PROF x N_LEVELS (" + std::to_string(nProf) + " x " +
+                   std::to_string(nLevels) + ") is too large to read");
+  }
   const std::size_t nValues = nProf * nLevels;
+  if (file.classicSize() != 0 && (nProf > file.classicSize() || nValues > file.classicSize())) {
+    throw ObsError(path + ": N_PROF x N_LEVELS (" + std::to_string(nProf) + " x " +
+                   std::to_string(nLevels) + ") declares more values than the file holds");
+  }
   const std::string variable = upper(options.variable);
 
   const Numbers lon = readNumbers(file, "LONGITUDE", perProfile, nProf);
