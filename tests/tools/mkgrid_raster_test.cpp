@@ -304,8 +304,18 @@ TEST_F(MkgridRaster, BadInputIsNamedAndLeavesNoFile) {
   const std::string nc = file("one.nc");
   test::makeNc(nc, lonLatCdl(3, 54.0, 3, 8.0));
   test::putValues(nc, "elevation", std::vector<float>(9, 0.0f));
+  // A classic NetCDF file cut short after its header: its values would read as zeros.
+  const std::string classic = file("cut.nc");
+  test::writeBytes(classic + ".cdl", "netcdf c {\n" + lonLatCdl(3, 54.0, 3, 8.0) +
+                                         " elevation = 1, 2, 3, 4, 5, 6, 7, 8, 9 ;\n}\n");
+  int made = -1;
+  test::commandOutput("ncgen -k classic -o " + quoted(classic) + " " + quoted(classic + ".cdl"),
+                      &made);
+  ASSERT_EQ(made, 0);
+  std::filesystem::resize_file(classic, std::filesystem::file_size(classic) - 20);
   const std::string tif = quoted(file("small.tif")) + " ";
   const std::pair<std::string, const char*> cases[] = {
+      {"-p UTM-32 " + quoted(classic) + " ", "cut.nc: a NetCDF file whose header declares more"},
       // arguments, part of the message
       {quoted(file("text.tif")) + " ", "text.tif: not a raster GDAL reads"},
       {quoted(file("none.tif")) + " ", "cannot open"},

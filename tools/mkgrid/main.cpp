@@ -1,5 +1,6 @@
 // karnet-mkgrid: makes a bathymetry file for karnet from a raster.
 #include <cstdio>
+#include <new>
 #include <string>
 
 #include "mkgrid/grid_builder.h"
@@ -21,8 +22,14 @@ int main(int argc, char** argv) {
   }
   Bathymetry bathymetry;
   std::string summary;
-  if (!makeBathymetry(options, &bathymetry, &summary, &message) ||
-      !writeBathymetry(options.output, bathymetry, &message)) {
+  bool made = false;
+  try {
+    made = makeBathymetry(options, &bathymetry, &summary, &message) &&
+           writeBathymetry(options.output, bathymetry, &message);
+  } catch (const std::bad_alloc&) {
+    message = options.input + ": not enough memory to read it";
+  }
+  if (!made) {
     std::fprintf(stderr, "karnet-mkgrid: %s\n", message.c_str());
     return 1;
   }

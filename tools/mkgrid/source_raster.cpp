@@ -8,9 +8,12 @@
 
 #include <algorithm>
 #include <cmath>
+#include <cstdint>
+#include <cstdio>
 #include <fstream>
 #include <vector>
 
+#include "gridfile/classic_header.h"
 #include "mkgrid/esri_ascii.h"
 
 namespace karnet::mkgrid {
@@ -178,8 +181,28 @@ bool pickVariable(const std::string& path, const std::string& variable, Dataset*
   return true;
 }
 
+// A classic NetCDF file (CDF-1, -2, -5) whose header declares more than the file holds: the
+// NetCDF library, under GDAL's driver, would allocate what the header declares (gigabytes from
+// a few bytes) and read a cut file's missing values as zeros.
+bool brokenClassicNetcdf(const std::string& path) {
+  std::FILE* stream = std::fopen(path.c_str(), "rb");
+  if (stream == nullptr) return false;
+  bool broken = false;
+  if (std::fseek(stream, 0, SEEK_END) == 0) {
+    const long size = std::ftell(stream);
+    broken = size > 0 && karnet::checkClassicHeader(stream, static_cast<std::uint64_t>(size)) ==
+                             karnet::ClassicHeader::kBroken;
+  }
+  std::fclose(stream);
+  return broken;
+}
+
 bool openWithGdal(const std::string& path, const std::string& variable, SourceRaster* source,
                   std::string* error) {
+  if (brokenClassicNetcdf(path)) {
+    *error = path + ": a NetCDF file whose header declares more than the file holds";
+    return false;
+  }
   CPLErrorReset();
   Dataset dataset(
       GDALOpenEx(path.c_str(), GDAL_OF_RASTER | GDAL_OF_READONLY, nullptr, nullptr, nullptr));
