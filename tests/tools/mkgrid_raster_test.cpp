@@ -316,6 +316,13 @@ TEST_F(MkgridRaster, BadInputIsNamedAndLeavesNoFile) {
   const std::string tif = quoted(file("small.tif")) + " ";
   const std::pair<std::string, const char*> cases[] = {
       {"-p UTM-32 " + quoted(classic) + " ", "cut.nc: a NetCDF file whose header declares more"},
+      // A 209-byte classic header, found by fuzzing, on which the NetCDF library under GDAL
+      // crashes while it cleans up after the fault.
+      {"-p UTM-32 " +
+           quoted(std::string(KARNET_SOURCE_DIR) +
+                  "/tests/fuzz/regressions/source_raster_bad_classic_header.nc") +
+           " ",
+       "source_raster_bad_classic_header.nc: a NetCDF file whose header declares more"},
       // arguments, part of the message
       {quoted(file("text.tif")) + " ", "text.tif: not a raster GDAL reads"},
       {quoted(file("none.tif")) + " ", "cannot open"},
