@@ -177,17 +177,25 @@ void grdRemoveTemporaryFiles() {
   }
 }
 
-bool grdCanCreate(const std::string& finalName) {
-  if (finalName.empty() || finalName.back() == '/') return false;
+std::string grdCreateProblem(const std::string& finalName) {
+  if (finalName.empty()) return "no file name";
+  if (finalName.back() == '/') return "the name ends in '/' (a directory)";
   struct stat info;
-  if (stat(finalName.c_str(), &info) == 0 && S_ISDIR(info.st_mode)) return false;
-  return access(directoryOf(finalName).c_str(), W_OK | X_OK) == 0;
+  if (stat(finalName.c_str(), &info) == 0 && S_ISDIR(info.st_mode)) return "is a directory";
+  const std::string directory = directoryOf(finalName);
+  if (stat(directory.c_str(), &info) != 0) return std::strerror(errno);
+  if (!S_ISDIR(info.st_mode)) return directory + " is not a directory";
+  if (access(directory.c_str(), W_OK | X_OK) != 0) return std::strerror(errno);
+  return std::string();
 }
+
+bool grdCanCreate(const std::string& finalName) { return grdCreateProblem(finalName).empty(); }
 
 bool grdCommitFile(const std::string& finalName, const void* bytes, std::size_t size,
                    std::string* error) {
-  if (!grdCanCreate(finalName)) {
-    if (error != nullptr) *error = "cannot create " + finalName;
+  const std::string problem = grdCreateProblem(finalName);
+  if (!problem.empty()) {
+    if (error != nullptr) *error = problem;
     return false;
   }
   const int unnamed = commitUnnamed(finalName, bytes, size, error);

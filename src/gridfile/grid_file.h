@@ -20,7 +20,9 @@ struct GrdCustomBlock;  // one float global attribute
 int grdInitSystem();
 
 // ---- reading ----
-int grdFileRead(const char* fileName, GrdHeader** header, GrdFile** file);
+// reason, when given, says why a file could not be opened ("not a regular file", ...).
+int grdFileRead(const char* fileName, GrdHeader** header, GrdFile** file,
+                std::string* reason = nullptr);
 int grdGetNoOfItems(GrdHeader* header);
 GrdItem* grdItemD(GrdHeader* header, int itemNumber);  // null when there is no such item
 int grdSetItemUnitConversion(GrdItem* item, int a, int b);  // converts nothing
@@ -95,7 +97,11 @@ int grdSetGeoreference(GrdHeader* header, const GrdGeoreference& georeference);
 int grdFileCreate(const char* fileName, GrdHeader* header, GrdFile** file);
 int grdWriteItemTimeStep(GrdHeader* header, GrdFile* file, double time, const float* data);
 // Closes the file; a complete file is renamed to its final name. Sets *file to null.
-int grdFileClose(GrdHeader* header, GrdFile** file);
+// reason, when given, says why the file could not be put in place.
+int grdFileClose(GrdHeader* header, GrdFile** file, std::string* reason = nullptr);
+// Why no file can be created under fileName (its directory is missing or not
+// writable, or the name is a directory); empty when one can.
+std::string grdCreateProblem(const std::string& fileName);
 // Drops a file that was created but must not appear; nothing of it reaches the disk.
 int grdFileAbandon(GrdHeader* header, GrdFile** file);
 

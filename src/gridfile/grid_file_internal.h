@@ -154,7 +154,7 @@ bool grdCommitFile(const std::string& finalName, const void* bytes, std::size_t 
                    std::string* error);
 
 // Checks that a file could be created under finalName (its directory is
-// writable and the name is not a directory).
+// writable and the name is not a directory); grdCreateProblem says why not.
 bool grdCanCreate(const std::string& finalName);
 
 }  // namespace karnet

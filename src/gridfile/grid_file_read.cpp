@@ -7,6 +7,7 @@
 #include <cfloat>
 #include <cmath>
 #include <cstdio>
+#include <cerrno>
 #include <cstring>
 #include <memory>
 #include <set>
@@ -361,28 +362,48 @@ bool streamStep(int ncid, const GrdItem& item, std::size_t step, Sink sink) {
 
 }  // namespace
 
-int grdFileRead(const char* fileName, GrdHeader** header, GrdFile** file) {
+int grdFileRead(const char* fileName, GrdHeader** header, GrdFile** file, std::string* reason) {
+  std::string ignored;
+  if (reason == nullptr) reason = &ignored;
   if (header == nullptr || file == nullptr) return 1;
   *header = nullptr;
   *file = nullptr;
-  if (fileName == nullptr || fileName[0] == '\0') return 1;
+  if (fileName == nullptr || fileName[0] == '\0') {
+    *reason = "no file name";
+    return 1;
+  }
   struct stat info;
-  if (stat(fileName, &info) != 0 || !S_ISREG(info.st_mode)) return 1;
+  if (stat(fileName, &info) != 0) {
+    *reason = std::strerror(errno);
+    return 1;
+  }
+  if (!S_ISREG(info.st_mode)) {
+    *reason = "not a regular file";
+    return 1;
+  }
   // A classic-format header that declares more than the file holds would make
   // the NetCDF library allocate and convert the declared sizes first.
   if (std::FILE* stream = std::fopen(fileName, "rb")) {
     const ClassicHeader header =
         checkClassicHeader(stream, static_cast<std::uint64_t>(info.st_size));
     std::fclose(stream);
-    if (header == ClassicHeader::kBroken) return 1;
+    if (header == ClassicHeader::kBroken) {
+      *reason = "its NetCDF header declares more than the file holds (a cut or damaged file)";
+      return 1;
+    }
   } else {
+    *reason = std::strerror(errno);
     return 1;
   }
   // A relative name goes to NetCDF as a path, never as a remote (URL) address.
   std::string path = fileName;
   if (path[0] != '/') path = "./" + path;
   int ncid = -1;
-  if (nc_open(path.c_str(), NC_NOWRITE, &ncid) != NC_NOERR) return 1;
+  const int status = nc_open(path.c_str(), NC_NOWRITE, &ncid);
+  if (status != NC_NOERR) {
+    *reason = std::string("cannot be read as NetCDF: ") + nc_strerror(status);
+    return 1;
+  }
   auto h = std::make_unique<GrdHeader>();
   h->reading = true;
   h->fileName = fileName;
@@ -392,6 +413,7 @@ int grdFileRead(const char* fileName, GrdHeader** header, GrdFile** file) {
   if (!readStructure(ncid, *h)) {
     nc_close(ncid);
     h->readFile->ncid = -1;
+    *reason = "its variables and attributes cannot be read";
     return 1;
   }
   *file = h->readFile.get();

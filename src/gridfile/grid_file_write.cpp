@@ -563,7 +563,7 @@ int grdWriteItemTimeStep(GrdHeader* header, GrdFile* file, double time, const fl
   return 0;
 }
 
-int grdFileClose(GrdHeader* header, GrdFile** file) {
+int grdFileClose(GrdHeader* header, GrdFile** file, std::string* reason) {
   if (file == nullptr || *file == nullptr) return 1;
   if (!validOpenFile(header, *file)) return 1;
   std::unique_ptr<GrdFile> f(*file);
@@ -571,16 +571,20 @@ int grdFileClose(GrdHeader* header, GrdFile** file) {
   header->writeFile = nullptr;
   if (f->failed) {
     nc_abort(f->ncid);
+    if (reason != nullptr) *reason = "its values could not be stored";
     return 1;
   }
   NC_memio memory{};
-  if (nc_close_memio(f->ncid, &memory) != NC_NOERR) {
+  const int status = nc_close_memio(f->ncid, &memory);
+  if (status != NC_NOERR) {
     std::free(memory.memory);
+    if (reason != nullptr) *reason = nc_strerror(status);
     return 1;
   }
   std::string error;
   const bool committed = grdCommitFile(f->finalName, memory.memory, memory.size, &error);
   std::free(memory.memory);
+  if (!committed && reason != nullptr) *reason = error;
   return committed ? 0 : 1;
 }
 

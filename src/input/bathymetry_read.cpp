@@ -45,36 +45,42 @@ void setAxis(AxisDescription& axis, std::int32_t count, float spacing) {
 }  // namespace
 
 int bathymetryRead(const char* fileName, FileDescription& description, int wantValues,
-                   FloatGrid2D& grid) {
+                   FloatGrid2D& grid, std::string* reason) {
+  std::string ignored;
+  if (reason == nullptr) reason = &ignored;
   grdInitSystem();
   GrdHeader* header = nullptr;
   GrdFile* file = nullptr;
-  if (grdFileRead(fileName, &header, &file) != 0) {
+  if (grdFileRead(fileName, &header, &file, reason) != 0) {
     grdHeaderDestroy(&header);
     return 0;
   }
-  auto fail = [&header]() {
+  auto fail = [&header, reason](const char* why) {
+    *reason = why;
     grdHeaderDestroy(&header);
     return 0;
   };
   grdGetNoOfItems(header);
   GrdItem* item = grdItemD(header, 1);
-  if (item == nullptr) return fail();
-  if (grdSetItemUnitConversion(item, 3, 0) != 0) return fail();
-  if (grdGetItemAxisType(item) != 5) return fail();
+  if (item == nullptr) return fail("no 2-D item (no data variable)");
+  if (grdSetItemUnitConversion(item, 3, 0) != 0) return fail("its item's values are unusable");
+  if (grdGetItemAxisType(item) != 5) {
+    return fail("no 2-D item on evenly spaced x and y nodes of positive spacing");
+  }
 
   std::int32_t jStart = 0, kStart = 0, nx = 0, ny = 0;
   double xOrigin = 0, yOrigin = 0;
   float dx = 0, dy = 0;
   grdGetItemAxisEqD2(item, &jStart, &kStart, &nx, &ny, &xOrigin, &yOrigin, &dx, &dy);
-  if (nx < 1 || ny < 1) return fail();
+  if (nx < 1 || ny < 1) return fail("its grid has no nodes");
   setAxis(description.axes[1], nx, dx);
   setAxis(description.axes[2], ny, dy);
 
   std::string projection;
   double longitude = 0, latitude = 0, orientation = 0;
   if (grdGetGeoInfoUTMProj(header, &projection, &longitude, &latitude, &orientation) != 0) {
-    return fail();
+    return fail(
+        "no crs variable with projection, origin_longitude, origin_latitude and orientation");
   }
   description.axes[1].origin = longitude;
   description.axes[2].origin = latitude;
@@ -82,7 +88,9 @@ int bathymetryRead(const char* fileName, FileDescription& description, int wantV
   readMiscBlock(header, description);
 
   double minimum = 0, maximum = 0;
-  if (grdGetItemStatsGlobal(item, &minimum, &maximum, nullptr) != 0) return fail();
+  if (grdGetItemStatsGlobal(item, &minimum, &maximum, nullptr) != 0) {
+    return fail("its item's values cannot be read");
+  }
   description.items[1].values[1] = static_cast<float>(minimum);
   description.items[1].values[2] = static_cast<float>(maximum);
 
@@ -90,9 +98,11 @@ int bathymetryRead(const char* fileName, FileDescription& description, int wantV
     grid2DFree(grid);
     grid = grid2DFromDescription(description);
     grid2DAlloc(grid);
-    if (grdFindBlockDynamic(header, file) != 0) return fail();
+    if (grdFindBlockDynamic(header, file) != 0) return fail("its item's values cannot be read");
     double time = 0;
-    if (grdReadItemTimeStep(header, file, &time, grid.data) != 0) return fail();
+    if (grdReadItemTimeStep(header, file, &time, grid.data) != 0) {
+      return fail("its item's values cannot be read");
+    }
   }
   grdHeaderDestroy(&header);
   return 1;

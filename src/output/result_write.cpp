@@ -48,25 +48,35 @@ int describeResult(GrdHeader* header, const FileDescription& d, std::int32_t ite
 
 int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
                 std::int32_t itemType, const FloatGrid3D& values, const char* projection,
-                const TextAttributes* globalAttributes) {
+                const TextAttributes* globalAttributes, std::string* reason) {
+  std::string ignored;
+  if (reason == nullptr) reason = &ignored;
   grdInitSystem();
   GrdHeader* header = nullptr;
   if (grdHeaderCreate(1, fileName, "", 1, 1, 2, &header) != 0) {
     grdHeaderDestroy(&header);
+    *reason = "cannot be described";
     return 0;
   }
   GrdFile* file = nullptr;
-  if (describeResult(header, description, itemType, projection, globalAttributes) != 0 ||
-      grdFileCreate(fileName, header, &file) != 0) {
+  if (describeResult(header, description, itemType, projection, globalAttributes) != 0) {
     grdHeaderDestroy(&header);
+    *reason = "its layout cannot be described (axes, projection or attributes)";
+    return 0;
+  }
+  if (grdFileCreate(fileName, header, &file) != 0) {
+    grdHeaderDestroy(&header);
+    *reason = grdCreateProblem(fileName != nullptr ? fileName : "");
+    if (reason->empty()) *reason = "cannot be created";
     return 0;
   }
   if (writeValues != 0 && grdWriteItemTimeStep(header, file, 0.0, values.data) != 0) {
     grdFileAbandon(header, &file);
     grdHeaderDestroy(&header);
+    *reason = "its values cannot be written";
     return 0;
   }
-  const int closed = grdFileClose(header, &file);
+  const int closed = grdFileClose(header, &file, reason);
   grdHeaderDestroy(&header);
   return closed == 0 ? 1 : 0;
 }

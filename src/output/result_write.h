@@ -2,6 +2,7 @@
 #define KARNET_OUTPUT_RESULT_WRITE_H_
 
 #include <cstdint>
+#include <string>
 
 #include "output/result_attributes.h"
 
@@ -18,10 +19,10 @@ struct FloatGrid3D;
 // turned grid); lon and lat every node's position (not for LOCAL); crs the CF
 // grid mapping. globalAttributes (title, history, ...) are added when given. 1 when the file was written and
 // closed, 0 on any failure; a failed write leaves no file under fileName and
-// keeps an earlier file of that name.
+// keeps an earlier file of that name; reason, when given, then says why.
 int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
                 std::int32_t itemType, const FloatGrid3D& values, const char* projection,
-                const TextAttributes* globalAttributes = nullptr);
+                const TextAttributes* globalAttributes = nullptr, std::string* reason = nullptr);
 
 }  // namespace karnet
 

@@ -163,12 +163,22 @@ TEST_F(GridFileRead, MalformedFiles) {
   test::putValues(path, "depth", std::vector<float>(10000, -3.0f));
   const std::string whole = test::readBytes(path);
   test::writeBytes(file("cut.nc"), whole.substr(0, whole.size() / 2));
-  for (const std::string& bad : {file("missing.nc"), file("text.nc"), file("cut.nc"), dir}) {
+  // Each refusal says why, in words for the user.
+  const std::pair<std::string, const char*> cases[] = {
+      {file("missing.nc"), "No such file or directory"},
+      {file("text.nc"), "cannot be read as NetCDF: "},
+      {file("cut.nc"), "cannot be read as NetCDF: "},
+      {dir, "not a regular file"},
+      {"", "no file name"},
+  };
+  for (const auto& [bad, why] : cases) {
     GrdHeader* header = reinterpret_cast<GrdHeader*>(this);
     GrdFile* handle = reinterpret_cast<GrdFile*>(this);
-    EXPECT_NE(grdFileRead(bad.c_str(), &header, &handle), 0) << bad;
+    std::string reason;
+    EXPECT_NE(grdFileRead(bad.c_str(), &header, &handle, &reason), 0) << bad;
     EXPECT_EQ(header, nullptr) << bad;
     EXPECT_EQ(handle, nullptr) << bad;
+    EXPECT_NE(reason.find(why), std::string::npos) << bad << ": " << reason;
   }
 }
 

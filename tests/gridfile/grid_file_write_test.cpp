@@ -122,6 +122,24 @@ TEST_F(GridFileWrite, RefusedSettingsAndPlaces) {
   EXPECT_NE(grdSetDeleteValFloat(r.header, 0.0f), 0);
 }
 
+// Why a file cannot be created, in the words the user sees after its name.
+TEST_F(GridFileWrite, CreateProblemsAreNamed) {
+  test::writeBytes(file("plain.txt"), "x\n");
+  EXPECT_EQ(grdCreateProblem(path), "");
+  EXPECT_EQ(grdCreateProblem(""), "no file name");
+  EXPECT_EQ(grdCreateProblem(file("out/")), "the name ends in '/' (a directory)");
+  EXPECT_EQ(grdCreateProblem(dir), "is a directory");
+  EXPECT_EQ(grdCreateProblem(file("no/such/dir/r.nc")), "No such file or directory");
+  EXPECT_EQ(grdCreateProblem(file("plain.txt/r.nc")), file("plain.txt") + " is not a directory");
+  if (geteuid() != 0) {  // permissions do not bind root
+    std::filesystem::create_directory(file("locked"));
+    std::filesystem::permissions(file("locked"), std::filesystem::perms::owner_read |
+                                                     std::filesystem::perms::owner_exec);
+    EXPECT_EQ(grdCreateProblem(file("locked/r.nc")), "Permission denied");
+    std::filesystem::permissions(file("locked"), std::filesystem::perms::owner_all);
+  }
+}
+
 // Until it is closed, a file is not under its name: an earlier file stays,
 // and an abandoned file, one whose header goes first or one that cannot take
 // its name leaves nothing.
