@@ -19,6 +19,7 @@
 #include "params/run_parameters.h"
 #include "params/run_settings.h"
 #include "state/run_state.h"
+#include "support/file_check.h"
 
 namespace karnet {
 
@@ -27,7 +28,7 @@ void reportInitError(std::int32_t /*lineNumber*/, const char* message) {
   exitRun(1);
 }
 
-int runPhases(const RunInvocation& invocation, RunSummary* summary) {
+int runPhases(const RunInvocation& invocation, RunSummary* summary, std::string* writeProblem) {
   RunState& state = runState();
   const RunSettings& settings = runSettings;
   std::int32_t lastObs = -1, jOff = 0, kOff = 0, lOff = 0;
@@ -55,7 +56,7 @@ int runPhases(const RunInvocation& invocation, RunSummary* summary) {
       runParameters, invocation.commandLine, KARNET_VERSION, resultTimestamp());
   return resultWrite(runParameters.outputData.FileName, *state.resultDescription, 1,
                      runParameters.outputData.ItemType, state.localValues, settings.projection,
-                     &attributes);
+                     &attributes, writeProblem);
 }
 
 void freeRunArrays(RunState& state) {
@@ -69,9 +70,11 @@ void runDriver(const RunInvocation& invocation) {
   installSignalHandlers();
   runInitialise(runState(), runSettings);
   RunSummary summary;
-  const int written = runPhases(invocation, &summary);
+  std::string writeProblem;
+  const int written = runPhases(invocation, &summary, &writeProblem);
   // A run whose result could not be written has not produced what it was for.
   if (written == 0) {
+    writeFileNotice(runParameters.outputData.FileName, writeProblem);
     logWrite("\nERROR while writing result file\n");
     exitRun(1);
   }

@@ -22,7 +22,8 @@ struct RunInvocation {
 
 // Scanning, bathymetry scan, interpolation, extraction and result file, in order.
 // Returns the result writer's result; fills summary when given.
-int runPhases(const RunInvocation& invocation = RunInvocation{}, RunSummary* summary = nullptr);
+int runPhases(const RunInvocation& invocation = RunInvocation{}, RunSummary* summary = nullptr,
+              std::string* writeProblem = nullptr);
 
 void freeRunArrays(RunState& state);
 

@@ -65,7 +65,9 @@ int bathymetryRead(const char* fileName, FileDescription& description, int wantV
   if (item == nullptr) return fail("no 2-D item (no data variable)");
   if (grdSetItemUnitConversion(item, 3, 0) != 0) return fail("its item's values are unusable");
   if (grdGetItemAxisType(item) != 5) {
-    return fail("no 2-D item on evenly spaced x and y nodes of positive spacing");
+    return fail(
+        "no usable 2-D item (numeric heights on evenly spaced x and y nodes of positive "
+        "spacing)");
   }
 
   std::int32_t jStart = 0, kStart = 0, nx = 0, ny = 0;

@@ -17,6 +17,7 @@
 #include "input/observation_line.h"
 #include "params/run_settings.h"
 #include "state/run_state.h"
+#include "support/file_check.h"
 #include "support/file_description.h"
 #include "support/memory_limit.h"
 
@@ -213,8 +214,10 @@ void dataScan(RunState& state, const RunSettings& s, const char* bathymetryFile,
   progressStatus("Reading bathymetry file ...");
   FileDescription* bathymetry = descriptionNew(2);
   if (bathymetry == nullptr) stopScan(state, "\nUnable to allocate memory \n");
-  if (bathymetryRead(bathymetryFile, *bathymetry, 1, state.bathymetryGrid) == 0) {
+  std::string problem;
+  if (bathymetryRead(bathymetryFile, *bathymetry, 1, state.bathymetryGrid, &problem) == 0) {
     descriptionFree(bathymetry);
+    writeFileNotice(bathymetryFile, problem);
     stopScan(state, "\nERROR while reading bathymetry file\n");
   }
   const double bedMin = static_cast<double>(bathymetry->items[1].values[1]);

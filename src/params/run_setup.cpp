@@ -5,6 +5,7 @@
 
 #include <cstdio>
 #include <cstring>
+#include <string>
 
 #include "control/command_line.h"
 #include "control/termination.h"
@@ -14,6 +15,7 @@
 #include "params/run_settings.h"
 #include "state/run_state.h"
 #include "support/date_time.h"
+#include "support/file_check.h"
 #include "support/file_description.h"
 
 namespace karnet {
@@ -30,10 +32,19 @@ void copyText(char* destination, std::size_t size, const char* source) {
 
 // Inputs must be readable regular files: a FIFO or a device would block the run
 // or never end.
-bool readable(const char* path) {
-  struct stat info;
-  return path[0] != '\0' && ::access(path, R_OK) == 0 && ::stat(path, &info) == 0 &&
-         S_ISREG(info.st_mode);
+bool readable(const char* path) { return inputFileProblem(path).empty(); }
+
+// Names on the standard error stream each input that stops the run and why:
+// one that is no readable regular file, or a bathymetry that could not be read
+// (bathymetryProblem, empty when it was).
+void reportInputProblems(const std::string& bathymetryProblem) {
+  const char* bathymetry = runParameters.inputFiles.FileName;
+  const char* observations = runParameters.inputFiles.DataFileName;
+  std::string problem = inputFileProblem(bathymetry);
+  if (problem.empty()) problem = bathymetryProblem;
+  if (!problem.empty()) writeFileNotice(bathymetry, problem);
+  problem = inputFileProblem(observations);
+  if (!problem.empty()) writeFileNotice(observations, problem);
 }
 
 // True when both names lead to one existing file (also through links).
@@ -148,12 +159,17 @@ int setupRun(const char* parameterFile) {
   if (bathymetry == nullptr) fatalError("Unable to allocate memory");
   // A file that cannot be read leaves the description at its creation values,
   // which the validation below rejects.
-  bathymetryRead(runParameters.inputFiles.FileName, *bathymetry, 1, runState().bathymetryGrid);
+  std::string bathymetryProblem;
+  bathymetryRead(runParameters.inputFiles.FileName, *bathymetry, 1, runState().bathymetryGrid,
+                 &bathymetryProblem);
   deriveSettings(*bathymetry, runSettings);
   runState().landValue = runSettings.landValue;
 
   char message[1024];
-  if (checkRunSettings(message, sizeof message) == 0) fatalError(message);
+  if (checkRunSettings(message, sizeof message) == 0) {
+    reportInputProblems(bathymetryProblem);
+    fatalError(message);
+  }
   if (resultIsOwnFile(parameterFile)) {
     std::snprintf(message, sizeof message, "ERROR: result file %s is one of the run's own files",
                   runParameters.outputData.FileName);

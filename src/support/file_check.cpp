@@ -4,6 +4,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
 
 namespace karnet {
@@ -17,6 +18,16 @@ std::string inputFileProblem(const char* path) {
   }
   if (::access(path, R_OK) != 0) return std::strerror(errno);
   return std::string();
+}
+
+std::string fileNotice(const std::string& file, const std::string& reason) {
+  return "karnet: " + file + ": " + reason + "\n";
+}
+
+void writeFileNotice(const std::string& file, const std::string& reason) {
+  const std::string line = fileNotice(file, reason);
+  std::fputs(line.c_str(), stderr);
+  std::fflush(stderr);
 }
 
 }  // namespace karnet

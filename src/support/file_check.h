@@ -11,6 +11,13 @@ namespace karnet {
 // the run or never end, so only regular files are taken.
 std::string inputFileProblem(const char* path);
 
+// The line that names a file and what is wrong with it on the standard error
+// stream: "karnet: FILE: REASON" and a line end.
+std::string fileNotice(const std::string& file, const std::string& reason);
+
+// Writes fileNotice(file, reason) to the standard error stream at once.
+void writeFileNotice(const std::string& file, const std::string& reason);
+
 }  // namespace karnet
 
 #endif  // KARNET_SUPPORT_FILE_CHECK_H_

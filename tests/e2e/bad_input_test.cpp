@@ -90,7 +90,24 @@ struct BadInput {
   bool writesResult = false;
   bool emptyResult = false;  // every node of the result holds the fill value
   bool notAsRoot = false;    // permissions do not bind root
+  // Expected in a line "karnet: ..." of the standard error stream ("" for none): the file that
+  // stopped the run and why. Written also in batch mode, where the log's messages are not.
+  std::string stderrText = {};
 };
+
+// The row, also expecting text in a "karnet: " line of the standard error stream.
+BadInput named(BadInput row, std::string text) {
+  row.stderrText = std::move(text);
+  return row;
+}
+
+// True when a line of err starts with "karnet: " and holds text.
+bool hasNoticeLine(const std::string& err, const std::string& text) {
+  for (const std::string& line : splitLines(err)) {
+    if (line.rfind("karnet: ", 0) == 0 && line.find(text) != std::string::npos) return true;
+  }
+  return false;
+}
 
 using P = ParameterFile&;
 using D = const TempDir&;
@@ -229,22 +246,26 @@ std::vector<BadInput> observationRows() {
          writeFile(d.file("observations.txt"), crlf);
        },
        0, "Completion code : Successful", true},
-      {"observation file missing", {}, [](D d) { fs::remove(d.file("observations.txt")); }, 1,
-       "ERROR: in input file selection"},
-      {"observation file is a directory", {},
-       [](D d) {
-         fs::remove(d.file("observations.txt"));
-         fs::create_directory(d.file("observations.txt"));
-       },
-       1, "ERROR: in input file selection"},
-      {"observation file is a FIFO", {}, [](D d) { makeFifo(d.file("observations.txt")); }, 1,
-       "ERROR: in input file selection"},
-      {"observation file is /dev/zero", {},
-       [](D d) {
-         fs::remove(d.file("observations.txt"));
-         fs::create_symlink("/dev/zero", d.file("observations.txt"));
-       },
-       1, "ERROR: in input file selection"},
+      named({"observation file missing", {}, [](D d) { fs::remove(d.file("observations.txt")); },
+             1, "ERROR: in input file selection"},
+            "observations.txt: No such file or directory"),
+      named({"observation file is a directory", {},
+             [](D d) {
+               fs::remove(d.file("observations.txt"));
+               fs::create_directory(d.file("observations.txt"));
+             },
+             1, "ERROR: in input file selection"},
+            "observations.txt: is a directory, not a regular file"),
+      named({"observation file is a FIFO", {}, [](D d) { makeFifo(d.file("observations.txt")); },
+             1, "ERROR: in input file selection"},
+            "observations.txt: not a regular file"),
+      named({"observation file is /dev/zero", {},
+             [](D d) {
+               fs::remove(d.file("observations.txt"));
+               fs::create_symlink("/dev/zero", d.file("observations.txt"));
+             },
+             1, "ERROR: in input file selection"},
+            "observations.txt: not a regular file"),
   };
 }
 
@@ -255,71 +276,91 @@ std::vector<BadInput> bathymetryRows() {
   const std::string unread = "dx = -0.000000 dy = -0.000000";
   const std::string item2d = "  float bathymetry(y, x) ; bathymetry:grid_mapping = \"crs\" ;\n";
   return {
-      {"truncated bathymetry", {},
-       [](D d) {
-         const std::string bytes = readFile(d.file("bathymetry.nc"));
-         writeFile(d.file("bathymetry.nc"), bytes.substr(0, bytes.size() / 2));
-       },
-       1, unread},
+      named({"truncated bathymetry", {},
+             [](D d) {
+               const std::string bytes = readFile(d.file("bathymetry.nc"));
+               writeFile(d.file("bathymetry.nc"), bytes.substr(0, bytes.size() / 2));
+             },
+             1, unread},
+            "bathymetry.nc: cannot be read as NetCDF: "),
       // A 613-byte classic file whose header declares an attribute of 6.7 GB.
-      {"bathymetry declaring gigabytes", {},
-       [](D d) {
-         fs::copy_file(std::string(KARNET_SOURCE_DIR) +
-                           "/tests/fuzz/regressions/bathymetry_huge_attribute.nc",
-                       d.file("bathymetry.nc"), fs::copy_options::overwrite_existing);
-       },
-       1, unread},
+      named({"bathymetry declaring gigabytes", {},
+             [](D d) {
+               fs::copy_file(std::string(KARNET_SOURCE_DIR) +
+                                 "/tests/fuzz/regressions/bathymetry_huge_attribute.nc",
+                             d.file("bathymetry.nc"), fs::copy_options::overwrite_existing);
+             },
+             1, unread},
+            "bathymetry.nc: its NetCDF header declares more than the file holds"),
       // The header is whole, the last heights are missing: they must not read as zeros.
-      {"classic bathymetry cut in its values", {},
-       [](D d) {
-         ncgen(d.file("bathymetry.nc"),
-               typedBathymetry("float", "-5, -10, -12, -9, -7, -20, -25, -4, -3, -8, -6, -2"),
-               "classic");
-         const std::string bytes = readFile(d.file("bathymetry.nc"));
-         writeFile(d.file("bathymetry.nc"), bytes.substr(0, bytes.size() - 8));
-       },
-       1, unread},
-      {"text as bathymetry", {}, [](D d) { writeFile(d.file("bathymetry.nc"), "CDF\x01 garbage"); },
-       1, unread},
-      {"empty bathymetry file", {}, [](D d) { writeFile(d.file("bathymetry.nc"), ""); }, 1, unread},
-      {"HDF5 file without variables", {}, nc("netcdf e {\ndimensions:\n  x = 4 ;\n}\n"), 1, unread},
-      {"1-D item", {},
-       nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n",
-                        "  float bathymetry(x) ; bathymetry:grid_mapping = \"crs\" ;\n")),
-       1, unread},
-      {"3-D item", {},
-       nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n  z = 2 ;\n",
-                        "  float bathymetry(z, y, x) ; bathymetry:grid_mapping = \"crs\" ;\n")),
-       1, unread},
-      {"zero-size dimension", {},
-       nc(bathymetryCdl("  y = 3 ;\n  x = UNLIMITED ;\n", item2d)), 1, unread},
-      {"huge declared dimensions", {},
-       nc(bathymetryCdl("  y = 50000 ;\n  x = 50000 ;\n",
-                        "  float bathymetry(y, x) ; bathymetry:grid_mapping = \"crs\" ;\n"
-                        "    bathymetry:_Storage = \"chunked\" ; bathymetry:_ChunkSizes = 500, 500 ;\n")),
-       1, unread},
-      {"NaN spacing", {},
-       nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n", item2d, "  x:spacing = NaN ;\n")), 1, unread},
-      {"negative spacing", {},
-       nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n", item2d, "  y:spacing = -250. ;\n")), 1, unread},
-      {"uneven coordinates", {},
-       nc("netcdf b {\ndimensions:\n  y = 3 ;\n  x = 4 ;\nvariables:\n  double x(x) ;\n"
-          "  double y(y) ;\n  float bathymetry(y, x) ;\n  int crs ; crs:projection = \"LOCAL\" ;\n"
-          "  crs:origin_longitude = 1000. ; crs:origin_latitude = 2000. ; crs:orientation = 0. ;\n"
-          "data:\n x = 0, 250, 600, 750 ;\n y = 0, 250, 500 ;\n}\n"),
-       1, unread},
-      {"char values", {},
-       nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n",
-                        "  char bathymetry(y, x) ; bathymetry:grid_mapping = \"crs\" ;\n")),
-       1, unread},
-      {"unusable packing", {},
-       nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n",
-                        "  short bathymetry(y, x) ; bathymetry:scale_factor = \"big\" ;\n")),
-       1, unread},
-      {"no crs variable", {},
-       nc("netcdf b {\ndimensions:\n  y = 3 ;\n  x = 4 ;\nvariables:\n  float bathymetry(y, x) ;\n"
-          "  double x(x) ; x:spacing = 250. ;\n  double y(y) ; y:spacing = 250. ;\n}\n"),
-       1, "\nERROR while reading bathymetry file\n"},
+      named({"classic bathymetry cut in its values", {},
+             [](D d) {
+               ncgen(d.file("bathymetry.nc"),
+                     typedBathymetry("float", "-5, -10, -12, -9, -7, -20, -25, -4, -3, -8, -6, -2"),
+                     "classic");
+               const std::string bytes = readFile(d.file("bathymetry.nc"));
+               writeFile(d.file("bathymetry.nc"), bytes.substr(0, bytes.size() - 8));
+             },
+             1, unread},
+            "bathymetry.nc: its NetCDF header declares more than the file holds"),
+      named({"text as bathymetry", {},
+             [](D d) { writeFile(d.file("bathymetry.nc"), "CDF\x01 garbage"); }, 1, unread},
+            "bathymetry.nc: its NetCDF header declares more than the file holds"),
+      named({"empty bathymetry file", {}, [](D d) { writeFile(d.file("bathymetry.nc"), ""); }, 1,
+             unread},
+            "bathymetry.nc: cannot be read as NetCDF: "),
+      named({"HDF5 file without variables", {}, nc("netcdf e {\ndimensions:\n  x = 4 ;\n}\n"), 1,
+             unread},
+            "bathymetry.nc: no 2-D item"),
+      named({"1-D item", {},
+             nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n",
+                              "  float bathymetry(x) ; bathymetry:grid_mapping = \"crs\" ;\n")),
+             1, unread},
+            "bathymetry.nc: no usable 2-D item"),
+      named({"3-D item", {},
+             nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n  z = 2 ;\n",
+                              "  float bathymetry(z, y, x) ; bathymetry:grid_mapping = \"crs\" ;\n")),
+             1, unread},
+            "bathymetry.nc: no usable 2-D item"),
+      named({"zero-size dimension", {},
+             nc(bathymetryCdl("  y = 3 ;\n  x = UNLIMITED ;\n", item2d)), 1, unread},
+            "bathymetry.nc: no usable 2-D item"),
+      named({"huge declared dimensions", {},
+             nc(bathymetryCdl("  y = 50000 ;\n  x = 50000 ;\n",
+                              "  float bathymetry(y, x) ; bathymetry:grid_mapping = \"crs\" ;\n"
+                              "    bathymetry:_Storage = \"chunked\" ; bathymetry:_ChunkSizes = 500, 500 ;\n")),
+             1, unread},
+            "bathymetry.nc: no usable 2-D item"),
+      named({"NaN spacing", {},
+             nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n", item2d, "  x:spacing = NaN ;\n")), 1,
+             unread},
+            "bathymetry.nc: no usable 2-D item"),
+      named({"negative spacing", {},
+             nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n", item2d, "  y:spacing = -250. ;\n")), 1,
+             unread},
+            "bathymetry.nc: no usable 2-D item"),
+      named({"uneven coordinates", {},
+             nc("netcdf b {\ndimensions:\n  y = 3 ;\n  x = 4 ;\nvariables:\n  double x(x) ;\n"
+                "  double y(y) ;\n  float bathymetry(y, x) ;\n  int crs ; crs:projection = \"LOCAL\" ;\n"
+                "  crs:origin_longitude = 1000. ; crs:origin_latitude = 2000. ; crs:orientation = 0. ;\n"
+                "data:\n x = 0, 250, 600, 750 ;\n y = 0, 250, 500 ;\n}\n"),
+             1, unread},
+            "bathymetry.nc: no usable 2-D item"),
+      named({"char values", {},
+             nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n",
+                              "  char bathymetry(y, x) ; bathymetry:grid_mapping = \"crs\" ;\n")),
+             1, unread},
+            "bathymetry.nc: no usable 2-D item"),
+      named({"unusable packing", {},
+             nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n",
+                              "  short bathymetry(y, x) ; bathymetry:scale_factor = \"big\" ;\n")),
+             1, unread},
+            "bathymetry.nc: no usable 2-D item"),
+      named({"no crs variable", {},
+             nc("netcdf b {\ndimensions:\n  y = 3 ;\n  x = 4 ;\nvariables:\n  float bathymetry(y, x) ;\n"
+                "  double x(x) ; x:spacing = 250. ;\n  double y(y) ; y:spacing = 250. ;\n}\n"),
+             1, "\nERROR while reading bathymetry file\n"},
+            "bathymetry.nc: no crs variable with projection"),
       {"int64 values", {}, nc(typedBathymetry("int64", "-5, -10, -12, -9, -7, -20, -25, -4, -3, -8, -6, -2")),
        0, "Completion code : Successful", true},
       {"classic format", {},
@@ -343,35 +384,43 @@ std::vector<BadInput> bathymetryRows() {
        "No. of bilinear interpolations          : 0", true, true},
       {"all NaN", {}, [](D d) { uniformBathymetry(d, std::nanf("")); }, 0,
        "No. of bilinear interpolations          : 0", true, true},
-      {"bathymetry is a FIFO", {}, [](D d) { makeFifo(d.file("bathymetry.nc")); }, 1,
-       "ERROR: in input file selection"},
-      {"bathymetry is a directory", {},
-       [](D d) {
-         fs::remove(d.file("bathymetry.nc"));
-         fs::create_directory(d.file("bathymetry.nc"));
-       },
-       1, "ERROR: in input file selection"},
+      named({"bathymetry is a FIFO", {}, [](D d) { makeFifo(d.file("bathymetry.nc")); }, 1,
+             "ERROR: in input file selection"},
+            "bathymetry.nc: not a regular file"),
+      named({"bathymetry is a directory", {},
+             [](D d) {
+               fs::remove(d.file("bathymetry.nc"));
+               fs::create_directory(d.file("bathymetry.nc"));
+             },
+             1, "ERROR: in input file selection"},
+            "bathymetry.nc: is a directory, not a regular file"),
   };
 }
 
 std::vector<BadInput> outputRows() {
   const std::string ownFile = "is one of the run's own files";
   return {
-      {"output directory missing", [](P p) { p.outputFileName = "|nowhere/result.nc|"; }, {}, 1,
-       "ERROR while writing result file"},
-      {"read-only output directory", [](P p) { p.outputFileName = "|locked/result.nc|"; },
-       [](D d) {
-         fs::create_directory(d.file("locked"));
-         writeFile(d.file("locked/result.nc"), kEarlierResult);
-         fs::permissions(d.file("locked"), fs::perms::owner_read | fs::perms::owner_exec);
-       },
-       1, "ERROR while writing result file", false, false, true},
-      {"output path is a directory", [](P p) { p.outputFileName = "|out|"; },
-       [](D d) { fs::create_directory(d.file("out")); }, 1, "ERROR while writing result file"},
-      {"output path ends in a slash", [](P p) { p.outputFileName = "|out/|"; }, {}, 1,
-       "ERROR while writing result file"},
-      {"output under a file", [](P p) { p.outputFileName = "|observations.txt/result.nc|"; }, {},
-       1, "ERROR while writing result file"},
+      named({"output directory missing", [](P p) { p.outputFileName = "|nowhere/result.nc|"; },
+             {}, 1, "ERROR while writing result file"},
+            "nowhere/result.nc: No such file or directory"),
+      named({"read-only output directory", [](P p) { p.outputFileName = "|locked/result.nc|"; },
+             [](D d) {
+               fs::create_directory(d.file("locked"));
+               writeFile(d.file("locked/result.nc"), kEarlierResult);
+               fs::permissions(d.file("locked"), fs::perms::owner_read | fs::perms::owner_exec);
+             },
+             1, "ERROR while writing result file", false, false, true},
+            "locked/result.nc: Permission denied"),
+      named({"output path is a directory", [](P p) { p.outputFileName = "|out|"; },
+             [](D d) { fs::create_directory(d.file("out")); }, 1,
+             "ERROR while writing result file"},
+            "out: is a directory"),
+      named({"output path ends in a slash", [](P p) { p.outputFileName = "|out/|"; }, {}, 1,
+             "ERROR while writing result file"},
+            "out/: the name ends in '/' (a directory)"),
+      named({"output under a file", [](P p) { p.outputFileName = "|observations.txt/result.nc|"; },
+             {}, 1, "ERROR while writing result file"},
+            "observations.txt/result.nc: observations.txt is not a directory"),
       {"output is the bathymetry", [](P p) { p.outputFileName = "|bathymetry.nc|"; }, {}, 1,
        ownFile},
       {"output is the observation file", [](P p) { p.outputFileName = "|observations.txt|"; }, {},
@@ -419,6 +468,10 @@ void runRow(const BadInput& row) {
   EXPECT_EQ(r.exitCode, row.exitCode) << log;
   EXPECT_NE(log.find(row.logText), std::string::npos) << "log lacks: " << row.logText << "\n"
                                                        << log;
+  if (!row.stderrText.empty()) {
+    EXPECT_TRUE(hasNoticeLine(r.err, row.stderrText))
+        << "no line \"karnet: ...\" with: " << row.stderrText << "\n" << r.err;
+  }
   EXPECT_NE(log.find(row.exitCode == 0 ? "-- Completion code : Successful"
                                         : "-- Completion code : Abnormal"),
             std::string::npos)
