@@ -243,18 +243,26 @@ int readAllSections() {
 
 }  // namespace
 
-int readParameterFile(const char* path) {
+int readParameterFile(const char* path, std::string* problem) {
   runParameters = RunParameters{};
   failureCause.clear();
+  auto tell = [problem](const char* text) {
+    logWrite(text);
+    if (problem == nullptr) return;
+    *problem = text;
+    while (!problem->empty() && (problem->back() == '\n' || problem->back() == '\r')) {
+      problem->pop_back();
+    }
+  };
   if (!loadParameterFile(path)) {
     // "Can't open NAME" for a file that cannot be read, "NAME:LINE: REASON"
     // for one that is not a well-formed parameter file.
-    logWrite(parErrorTextGlb());
+    tell(parErrorTextGlb());
     return 0;
   }
   const int result = readAllSections();
   closeParameterFile();
-  if (result == 0) logWrite(failureCause.empty() ? "parameter file incomplete" : failureCause.c_str());
+  if (result == 0) tell(failureCause.empty() ? "parameter file incomplete" : failureCause.c_str());
   return result;
 }
 

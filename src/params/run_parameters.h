@@ -2,6 +2,7 @@
 #define KARNET_PARAMS_RUN_PARAMETERS_H_
 
 #include <cstdint>
+#include <string>
 
 namespace karnet {
 
@@ -55,7 +56,9 @@ extern RunParameters runParameters;
 // Loads the file, reads the five sections into runParameters and echoes them to
 // the log. 1 on success; on failure 0, after writing one cause line to the log
 // ("Can't open NAME" or "FILE:LINE: REASON").
-int readParameterFile(const char* path);
+// problem, when given, receives what the log was told on failure ("NAME:LINE:
+// REASON", "Can't open NAME", ...), without its line end.
+int readParameterFile(const char* path, std::string* problem = nullptr);
 
 }  // namespace karnet
 

@@ -153,7 +153,12 @@ int checkRunSettings(char* buffer, std::size_t size) {
 }
 
 int setupRun(const char* parameterFile) {
-  if (readParameterFile(parameterFile) == 0) fatalError("Error in parameter file");
+  std::string parameterProblem;
+  if (readParameterFile(parameterFile, &parameterProblem) == 0) {
+    // The log holds the reason on the line before; the user sees it too.
+    writeNotice(parameterProblem);
+    fatalError("Error in parameter file");
+  }
 
   FileDescription* bathymetry = descriptionNew(2);
   if (bathymetry == nullptr) fatalError("Unable to allocate memory");

@@ -24,10 +24,14 @@ std::string fileNotice(const std::string& file, const std::string& reason) {
   return "karnet: " + file + ": " + reason + "\n";
 }
 
-void writeFileNotice(const std::string& file, const std::string& reason) {
-  const std::string line = fileNotice(file, reason);
+void writeNotice(const std::string& text) {
+  const std::string line = "karnet: " + text + "\n";
   std::fputs(line.c_str(), stderr);
   std::fflush(stderr);
+}
+
+void writeFileNotice(const std::string& file, const std::string& reason) {
+  writeNotice(file + ": " + reason);
 }
 
 }  // namespace karnet

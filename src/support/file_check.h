@@ -18,6 +18,10 @@ std::string fileNotice(const std::string& file, const std::string& reason);
 // Writes fileNotice(file, reason) to the standard error stream at once.
 void writeFileNotice(const std::string& file, const std::string& reason);
 
+// Writes "karnet: TEXT" and a line end to the standard error stream at once,
+// for a text that names its file itself ("case.pfs:3: ...").
+void writeNotice(const std::string& text);
+
 }  // namespace karnet
 
 #endif  // KARNET_SUPPORT_FILE_CHECK_H_

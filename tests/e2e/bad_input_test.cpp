@@ -125,8 +125,10 @@ std::vector<BadInput> parameterFileRows() {
   std::string binary;
   for (int i = 0; i < 4096; ++i) binary += static_cast<char>((i * 7919 + 13) % 256);
   return {
-      {"empty parameter file", {}, pfs(""), 1, "target [Q4_DIGITIZING_OF_DATA] not found"},
-      {"binary parameter file", {}, pfs(binary), 1, "Error in parameter file"},
+      named({"empty parameter file", {}, pfs(""), 1, "target [Q4_DIGITIZING_OF_DATA] not found"},
+            "case.pfs:1: target [Q4_DIGITIZING_OF_DATA] not found"),
+      named({"binary parameter file", {}, pfs(binary), 1, "Error in parameter file"},
+            "case.pfs:1: NUL byte in the line"),
       {"sections 50 deep", {}, pfs(deep), 1, "target [Q4_DIGITIZING_OF_DATA] not found"},
       {"target 50 sections deep", {},
        [](D d) {
@@ -162,12 +164,16 @@ std::vector<BadInput> parameterFileRows() {
        "section [OUTPUT_DATA] not found"},
       {"other target name", {}, swapInPfs("[Q4_DIGITIZING_OF_DATA]", "[Q5]"), 1,
        "target [Q4_DIGITIZING_OF_DATA] not found"},
-      {"parameter file is a directory", {},
-       [](D d) {
-         fs::remove(d.file("case.pfs"));
-         fs::create_directory(d.file("case.pfs"));
-       },
-       1, "Can't open case.pfs"},
+      named({"parameter file is a directory", {},
+             [](D d) {
+               fs::remove(d.file("case.pfs"));
+               fs::create_directory(d.file("case.pfs"));
+             },
+             1, "Can't open case.pfs"},
+            "Can't open case.pfs"),
+      named({"keyword with a bad value, named with its line", [](P p) { p.spacing = "abc"; }, {}, 1,
+             "(the word abc) is not a number"},
+            "case.pfs:11: keyword Spacing: parameter 1 (the word abc) is not a number"),
       {"parameter file is /dev/zero", {},
        [](D d) {
          fs::remove(d.file("case.pfs"));
@@ -501,7 +507,15 @@ void runRow(const BadInput& row) {
 }
 
 TEST(BadInput, ParameterFiles) {
-  for (const BadInput& row : parameterFileRows()) runRow(row);
+  for (BadInput row : parameterFileRows()) {
+    // What the log says about a parameter file that cannot be read is also on the standard
+    // error stream (the rows named in parameterFileRows give the whole line).
+    if (row.exitCode == 1 && row.stderrText.empty() &&
+        row.logText != "ERROR: Unable to allocate memory") {
+      row.stderrText = row.logText;
+    }
+    runRow(row);
+  }
 }
 
 TEST(BadInput, ObservationFiles) {
