@@ -1,5 +1,6 @@
 #include "input/run_initialise.h"
 
+#include <cerrno>
 #include <cstdio>
 #include <cstring>
 
@@ -10,6 +11,7 @@
 #include "params/run_settings.h"
 #include "state/run_state.h"
 #include "support/date_time.h"
+#include "support/file_check.h"
 #include "support/file_description.h"
 #include "support/memory_limit.h"
 
@@ -97,7 +99,10 @@ void runInitialise(RunState& state, const RunSettings& s) {
   progressStatus("Initializing ...");
 
   state.observationFile = std::fopen(s.dataFileName, "rb");
-  if (state.observationFile == nullptr) reportInitError(-1, "unable to open ASCII data file");
+  if (state.observationFile == nullptr) {
+    writeFileNotice(s.dataFileName, std::strerror(errno));
+    reportInitError(-1, "unable to open ASCII data file");
+  }
   const std::int64_t count = countLines(state.observationFile);
   if (count <= kMaxElements) requireMemory(nj, nk, nl, count);
   if (count > kMaxElements || !scatterDataAlloc(state.scatter, count)) reportInitError(-1, "Unable to allocate memory");

@@ -301,6 +301,11 @@ int main(int argc, char** argv) {
   } catch (const std::bad_alloc&) {
     std::fprintf(stderr, "karnet-obs: out of memory\n");
     return 1;
+  } catch (const std::exception& e) {
+    // Nothing throws anything else on purpose; should it happen, the program
+    // still ends with a message and exit code 1 rather than an abort.
+    std::fprintf(stderr, "karnet-obs: %s\n", e.what());
+    return 1;
   }
   return 0;
 }
