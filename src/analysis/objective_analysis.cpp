@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <cstdio>
 
+#include "analysis/error_variance.h"
 #include "analysis/filters.h"
 #include "analysis/objan.h"
 #include "analysis/select_data.h"
@@ -38,6 +39,13 @@ void collectDataCells(OaWorkspace& ws, const FloatGrid2D& grid, std::int32_t nDa
     }
   }
   ws.dataCount = collected;
+}
+
+// Stores e at local node (p, q, s) of the error field, when the node lies in it.
+void recordErrorVariance(FloatGrid3D& field, float e, std::int64_t p, std::int64_t q,
+                         std::int64_t s) {
+  if (p < 0 || p >= field.nj || q < 0 || q >= field.nk || s < 0 || s >= field.nl) return;
+  field.data[(s * field.nk + q) * field.nj + p] = e;
 }
 
 }  // namespace
@@ -89,6 +97,10 @@ std::int32_t analyseLayer(OaWorkspace& ws, FloatGrid2D& grid, std::int32_t nData
       // arrays, not the grid, feed later estimates.
       if (OBJAN(ws, m, &grid.data[at], settings) == 0) {
         ++successes;
+        if (input.errorField != nullptr) {
+          recordErrorVariance(*input.errorField, estimateErrorVariance(ws, m), j - input.jOff,
+                              k - input.kOff, l - input.lOff);
+        }
       } else {
         ++failed;
       }
@@ -122,7 +134,8 @@ std::int32_t analyseLayer(OaWorkspace& ws, FloatGrid2D& grid, std::int32_t nData
 }
 
 void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff,
-                       std::int32_t lOff, RunState& state, const RunSettings& settings) {
+                       std::int32_t lOff, RunState& state, const RunSettings& settings,
+                       FloatGrid3D* errorField) {
   FloatGrid2D analysisGrid;
   analysisGrid.j0 = 0;
   analysisGrid.k0 = 0;
@@ -150,6 +163,7 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
   input.jOff = jOff;
   input.kOff = kOff;
   input.lOff = lOff;
+  input.errorField = errorField;
 
   OaWorkspace ws;
   std::int64_t dataCells = 0;

@@ -16,8 +16,12 @@ namespace karnet {
 // [MinData, MaxData], blanks dry nodes and writes each layer back into
 // state.basicValues. Ends with the statistics block in the log.
 // (jOff, kOff, lOff) is the basic node of the local grid's first node.
+// errorField, when given, is a grid of the local grid's shape (filled with the
+// delete value beforehand) that receives the relative error variance of every
+// successful estimate at its node.
 void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff,
-                       std::int32_t lOff, RunState& state, const RunSettings& settings);
+                       std::int32_t lOff, RunState& state, const RunSettings& settings,
+                       FloatGrid3D* errorField = nullptr);
 
 // Number of cells of the grid that hold a value (differ from deleteValue).
 std::int32_t countDataCells(const FloatGrid2D& grid, double deleteValue);
@@ -30,6 +34,10 @@ struct LayerAnalysisInput {
   std::int32_t jOff = 0;                    // basic node of the local grid's first node
   std::int32_t kOff = 0;
   std::int32_t lOff = 0;
+  // When set: the local grid's error field; every successful estimate at
+  // footprint node (j, k) of layer l writes its relative error variance to
+  // local node (j - jOff, k - kOff, l - lOff).
+  FloatGrid3D* errorField = nullptr;
 };
 
 // Analyses the layer held in grid (origin (0, 0), basic layer l) in place:

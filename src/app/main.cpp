@@ -7,8 +7,10 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <string>
 
 #include "control/command_line.h"
+#include "control/cross_validate_run.h"
 #include "control/host.h"
 #include "control/log.h"
 #include "control/run_driver.h"
@@ -29,6 +31,15 @@ constexpr char kHelp[] =
     "Options:\n"
     "  //apv      run under the progress display; q or SIGUSR1 cancels the run\n"
     "  -debug     accepted, without effect\n"
+    "  --cross-validate\n"
+    "             leave one cast out at a time and compare the objective analysis\n"
+    "             with it: RMS and bias per level on stdout and in CASE_cv.csv;\n"
+    "             no result file is written\n"
+    "  --sweep KEYWORD=V1,V2,... [KEYWORD=...]\n"
+    "             cross-validate every combination of these objective-analysis\n"
+    "             values (DecayDistance, ZeroCrossingDistance, ErrorVariance,\n"
+    "             CorrelationSampleSize, SearchRadius, MinData, MaxData); the table,\n"
+    "             best combination marked, goes to stdout and CASE_sweep.csv\n"
     "  --help     this text\n"
     "  --version  the program's version\n"
     "\n"
@@ -49,6 +60,7 @@ constexpr char kHelp[] =
 // Kept for the host's callback, which takes no arguments.
 int argumentCount = 0;
 char** argumentVector = nullptr;
+karnet::CrossValidationRequest crossValidation;
 
 // Picks the parameter file, opens the log beside it, sets the run up and runs it.
 [[noreturn]] void runMain(int count, char** arguments) {
@@ -68,6 +80,7 @@ char** argumentVector = nullptr;
   karnet::logSetStream(log != nullptr ? log : stderr);
 
   karnet::setupRun(parameterFile);
+  if (crossValidation.active) karnet::crossValidateDriver(crossValidation, parameterFile);
   karnet::runDriver();
 }
 
@@ -100,6 +113,13 @@ int main(int argc, char** argv) {
   setenv("H84", hostMode ? "APV" : "WIN", 1);
 
   if (answerInformationRequest(argumentCount, argumentVector)) return 0;
+
+  std::string problem;
+  if (!karnet::takeCrossValidationArguments(argumentCount, argumentVector, crossValidation,
+                                            problem)) {
+    std::fprintf(stderr, "karnet: %s\n%s\n", problem.c_str(), kUsage);
+    return 1;
+  }
 
   if (hostMode) {
     char programName[karnet::kFileNameSize] = "";

@@ -16,6 +16,7 @@
 #include "params/run_parameters.h"
 #include "params/run_settings.h"
 #include "state/run_state.h"
+#include "support/float_grid.h"
 
 namespace karnet {
 
@@ -34,15 +35,26 @@ int runPhases() {
   progressStatus("Scanning bathymetry ...");
   bathymetryScan(jOff, kOff, lOff, state, settings);
   progressStatus("Initialising ...");
+  // The objective analysis also gives the error variance of its estimates,
+  // written beside the result's item; nodes without an estimate keep the fill.
+  FloatGrid3D errorField;
   if (settings.Analysis == 0) {
-    objectiveAnalysis(lastObs, jOff, kOff, lOff, state, settings);
+    errorField = state.localValues;
+    errorField.data = nullptr;
+    grid3DAlloc(errorField);
+    grid3DFill(errorField, static_cast<float>(state.deleteValue()));
+    objectiveAnalysis(lastObs, jOff, kOff, lOff, state, settings, &errorField);
   } else {
     interp(lastObs, jOff, kOff, lOff, state, settings);
   }
   glo2loc(jOff, kOff, lOff, state, settings);
   progressStatus("Saving data ...");
-  return resultWrite(runParameters.outputData.FileName, *state.resultDescription, 1,
-                     runParameters.outputData.ItemType, state.localValues, settings.projection);
+  const int written =
+      resultWrite(runParameters.outputData.FileName, *state.resultDescription, 1,
+                  runParameters.outputData.ItemType, state.localValues, settings.projection,
+                  errorField.data != nullptr ? &errorField : nullptr);
+  if (errorField.data != nullptr) grid3DFree(errorField);
+  return written;
 }
 
 void freeRunArrays(RunState& state) {

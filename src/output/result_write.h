@@ -10,11 +10,14 @@ struct FloatGrid3D;
 
 // Writes the local result grid as a 3-D gridded file with one item of the given
 // type, the description's axes, custom block and geographic information, and
-// (with writeValues) one time step of values. 1 when the file was written and
-// closed, 0 on any failure; a failed write leaves no file under fileName and
-// keeps an earlier file of that name.
+// (with writeValues) one time step of values. With errorValues (the
+// objective analysis' error field, same shape as values) the file gets a second
+// item "<item>_error" that item 1 names as its ancillary variable. 1 when the
+// file was written and closed, 0 on any failure; a failed write leaves no file
+// under fileName and keeps an earlier file of that name.
 int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
-                std::int32_t itemType, const FloatGrid3D& values, const char* projection);
+                std::int32_t itemType, const FloatGrid3D& values, const char* projection,
+                const FloatGrid3D* errorValues = nullptr);
 
 }  // namespace karnet
 

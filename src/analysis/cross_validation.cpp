@@ -1,0 +1,257 @@
+// Leave-one-cast-out cross-validation of the objective analysis.
+#include "analysis/cross_validation.h"
+
+#include <algorithm>
+#include <atomic>
+#include <cmath>
+#include <cstring>
+#include <mutex>
+#include <thread>
+
+#include "analysis/objan.h"
+#include "analysis/select_data.h"
+#include "analysis/workspace.h"
+#include "interp/node_tests.h"
+
+namespace karnet {
+namespace {
+
+// The checked allocator keeps one table of live blocks for the process; the
+// workers take turns at it.
+std::mutex allocatorMutex;
+
+struct Footprint {
+  std::int32_t jFirst = 0, jLast = -1, kFirst = 0, kLast = -1, lFirst = 0, lLast = -1;
+
+  bool holds(std::int32_t j, std::int32_t k) const {
+    return j >= jFirst && j <= jLast && k >= kFirst && k <= kLast;
+  }
+};
+
+Footprint footprintOf(const CvInput& input, const RunSettings& s) {
+  Footprint f;
+  f.jFirst = input.jOff;
+  f.jLast = input.jOff + (s.jx - s.j0);
+  f.kFirst = input.kOff;
+  f.kLast = input.kOff + (s.kx - s.k0);
+  f.lFirst = input.lOff;
+  f.lLast = input.lOff + (s.lx - s.l0);
+  return f;
+}
+
+float valueAt(const FloatGrid3D& g, std::int32_t j, std::int32_t k, std::int32_t l) {
+  return g.data[(std::int64_t{l} * g.nk + k) * g.nj + j];
+}
+
+bool layerInside(const FloatGrid3D& g, std::int32_t l) { return l >= 0 && l < g.nl; }
+
+// A data node that the validation compares: in the footprint, wet, holding data.
+bool validatedNode(const CvInput& input, const Footprint& f, std::int32_t j, std::int32_t k,
+                   std::int32_t l) {
+  if (!f.holds(j, k) || !layerInside(*input.values, l)) return false;
+  if (j < 0 || j >= input.values->nj || k < 0 || k >= input.values->nk) return false;
+  if (isEmptyCell(valueAt(*input.values, j, k, l), input.deleteValue)) return false;
+  return !isDryCell(valueAt(*input.bathymetry, j, k, l), input.landValue);
+}
+
+// Whether layer l has a node to validate.
+bool layerHasWork(const CvInput& input, const Footprint& f, std::int32_t l) {
+  if (!layerInside(*input.values, l)) return false;
+  const std::int32_t jEnd = std::min(f.jLast, input.values->nj - 1);
+  const std::int32_t kEnd = std::min(f.kLast, input.values->nk - 1);
+  for (std::int32_t j = std::max(f.jFirst, 0); j <= jEnd; ++j) {
+    for (std::int32_t k = std::max(f.kFirst, 0); k <= kEnd; ++k) {
+      if (validatedNode(input, f, j, k, l)) return true;
+    }
+  }
+  return false;
+}
+
+// Takes data cell i out of the workspace's cells (kept in column order, so the
+// column index only shifts) and puts it back.
+struct LeftOut {
+  float x = 0, y = 0, value = 0;
+};
+
+void shift(float* a, std::int32_t from, std::int32_t to, std::int32_t count) {
+  std::memmove(a + to, a + from, static_cast<std::size_t>(count) * sizeof(float));
+}
+
+void columnsAfter(OaWorkspace& ws, float x, std::int32_t delta) {
+  if (ws.columnStart == nullptr) return;
+  for (std::int32_t c = static_cast<std::int32_t>(x) + 1; c <= ws.columnCount; ++c) {
+    ws.columnStart[c] += delta;
+  }
+}
+
+LeftOut leaveOut(OaWorkspace& ws, std::int32_t i) {
+  const LeftOut cell{ws.dataX[i], ws.dataY[i], ws.dataValue[i]};
+  const std::int32_t tail = ws.dataCount - i - 1;
+  shift(ws.dataX, i + 1, i, tail);
+  shift(ws.dataY, i + 1, i, tail);
+  shift(ws.dataValue, i + 1, i, tail);
+  --ws.dataCount;
+  columnsAfter(ws, cell.x, -1);
+  return cell;
+}
+
+void putBack(OaWorkspace& ws, std::int32_t i, const LeftOut& cell) {
+  const std::int32_t tail = ws.dataCount - i;
+  shift(ws.dataX, i, i + 1, tail);
+  shift(ws.dataY, i, i + 1, tail);
+  shift(ws.dataValue, i, i + 1, tail);
+  ws.dataX[i] = cell.x;
+  ws.dataY[i] = cell.y;
+  ws.dataValue[i] = cell.value;
+  ++ws.dataCount;
+  columnsAfter(ws, cell.x, +1);
+}
+
+// One layer of one trial: every validated data node estimated without its cast.
+CvStats validateLayer(const CvInput& input, const RunSettings& s, std::int32_t l) {
+  const FloatGrid3D& values = *input.values;
+  const std::int32_t nj = values.nj;
+  const std::int32_t nk = values.nk;
+  const Footprint f = footprintOf(input, s);
+  const float* layer = values.data + std::int64_t{l} * nj * nk;
+
+  std::int32_t nData = 0;
+  for (std::int64_t c = 0; c < std::int64_t{nj} * nk; ++c) {
+    if (!isEmptyCell(layer[c], input.deleteValue)) ++nData;
+  }
+
+  OaWorkspace ws;
+  {
+    const std::lock_guard<std::mutex> lock(allocatorMutex);
+    workspaceSetUp(ws, nData, nj, nk, s);
+  }
+  // The layer's cells in the order the analysis collects them: x outer, y inner.
+  std::int32_t n = 0;
+  for (std::int32_t j = 0; j < nj; ++j) {
+    for (std::int32_t k = 0; k < nk; ++k) {
+      const float v = layer[std::int64_t{k} * nj + j];
+      if (isEmptyCell(v, input.deleteValue)) continue;
+      ws.dataX[n] = static_cast<float>(j);
+      ws.dataY[n] = static_cast<float>(k);
+      ws.dataValue[n] = v;
+      ++n;
+    }
+  }
+  ws.dataCount = n;
+  {
+    const std::lock_guard<std::mutex> lock(allocatorMutex);
+    workspaceIndexColumns(ws, nj);
+  }
+
+  CvStats stats;
+  for (std::int32_t i = 0; i < n; ++i) {
+    const auto j = static_cast<std::int32_t>(ws.dataX[i]);
+    const auto k = static_cast<std::int32_t>(ws.dataY[i]);
+    if (!validatedNode(input, f, j, k, l)) continue;
+    const LeftOut cell = leaveOut(ws, i);
+    const std::int32_t m = selectData(ws, j, k, s);
+    float estimate = 0.0f;
+    const bool made = OBJAN(ws, m, &estimate, s) == 0 && !std::isnan(estimate);
+    putBack(ws, i, cell);
+    if (!made) {
+      ++stats.missed;
+      continue;
+    }
+    // Clipped as the analysis clips its layer.
+    if (estimate > s.MaxData) estimate = s.MaxData;
+    if (s.MinData > estimate) estimate = s.MinData;
+    const double difference = static_cast<double>(estimate) - static_cast<double>(cell.value);
+    ++stats.nodes;
+    stats.sumDifference += difference;
+    stats.sumSquare += difference * difference;
+  }
+
+  {
+    const std::lock_guard<std::mutex> lock(allocatorMutex);
+    workspaceRelease(ws);
+  }
+  return stats;
+}
+
+struct Task {
+  std::size_t trial = 0;
+  std::int32_t l = 0;
+  CvStats stats;
+};
+
+}  // namespace
+
+void CvStats::add(const CvStats& other) {
+  nodes += other.nodes;
+  missed += other.missed;
+  sumDifference += other.sumDifference;
+  sumSquare += other.sumSquare;
+}
+
+double CvStats::rms() const {
+  return nodes > 0 ? std::sqrt(sumSquare / static_cast<double>(nodes)) : 0.0;
+}
+
+double CvStats::bias() const {
+  return nodes > 0 ? sumDifference / static_cast<double>(nodes) : 0.0;
+}
+
+std::int64_t countValidatedCasts(const CvInput& input, const RunSettings& settings) {
+  const Footprint f = footprintOf(input, settings);
+  const FloatGrid3D& values = *input.values;
+  std::int64_t casts = 0;
+  for (std::int32_t j = std::max(f.jFirst, 0); j <= std::min(f.jLast, values.nj - 1); ++j) {
+    for (std::int32_t k = std::max(f.kFirst, 0); k <= std::min(f.kLast, values.nk - 1); ++k) {
+      for (std::int32_t l = f.lFirst; l <= f.lLast; ++l) {
+        if (validatedNode(input, f, j, k, l)) {
+          ++casts;
+          break;
+        }
+      }
+    }
+  }
+  return casts;
+}
+
+std::vector<CvResult> crossValidate(const CvInput& input, const std::vector<RunSettings>& trials,
+                                    std::int32_t threads) {
+  std::vector<CvResult> results(trials.size());
+  std::vector<Task> tasks;
+  for (std::size_t t = 0; t < trials.size(); ++t) {
+    const RunSettings& s = trials[t];
+    const Footprint f = footprintOf(input, s);
+    results[t].firstLevel = s.l0;
+    results[t].levels.assign(static_cast<std::size_t>(std::max(s.lx - s.l0 + 1, 0)), CvStats{});
+    for (std::int32_t l = f.lFirst; l <= f.lLast; ++l) {
+      if (layerHasWork(input, f, l)) tasks.push_back(Task{t, l, CvStats{}});
+    }
+  }
+
+  // Workers take the next task in turn; each task's result has its own slot,
+  // and the slots are summed in task order afterwards.
+  std::atomic<std::size_t> next{0};
+  auto work = [&]() {
+    for (std::size_t i = next++; i < tasks.size(); i = next++) {
+      tasks[i].stats = validateLayer(input, trials[tasks[i].trial], tasks[i].l);
+    }
+  };
+  const std::size_t workers =
+      std::min<std::size_t>(static_cast<std::size_t>(std::max(threads, 1)), tasks.size());
+  if (workers <= 1) {
+    work();
+  } else {
+    std::vector<std::thread> pool;
+    for (std::size_t w = 0; w < workers; ++w) pool.emplace_back(work);
+    for (std::thread& t : pool) t.join();
+  }
+
+  for (const Task& task : tasks) {
+    CvResult& r = results[task.trial];
+    const std::int32_t level = task.l - input.lOff;  // index from the first local level
+    r.levels[static_cast<std::size_t>(level)].add(task.stats);
+    r.overall.add(task.stats);
+  }
+  return results;
+}
+
+}  // namespace karnet
