@@ -30,6 +30,7 @@ constexpr char kHelp[] =
     "\n"
     "Options:\n"
     "  //apv      run under the progress display; q or SIGUSR1 cancels the run\n"
+    "  --quiet    no summary (result, grid, observations) on stderr at the end\n"
     "  -debug     accepted, without effect\n"
     "  --cross-validate\n"
     "             leave one cast out at a time and compare the objective analysis\n"
@@ -60,6 +61,7 @@ constexpr char kHelp[] =
 // Kept for the host's callback, which takes no arguments.
 int argumentCount = 0;
 char** argumentVector = nullptr;
+const char* programPath = "karnet";
 karnet::CrossValidationRequest crossValidation;
 
 // Picks the parameter file, opens the log beside it, sets the run up and runs it.
@@ -79,9 +81,12 @@ karnet::CrossValidationRequest crossValidation;
   if (log != nullptr) std::setvbuf(log, nullptr, _IOLBF, 0);
   karnet::logSetStream(log != nullptr ? log : stderr);
 
+  karnet::RunInvocation invocation;
+  invocation.commandLine = karnet::commandLineText(programPath, count, arguments);
+  invocation.quiet = karnet::hasQuietArgument(count, arguments);
   karnet::setupRun(parameterFile);
   if (crossValidation.active) karnet::crossValidateDriver(crossValidation, parameterFile);
-  karnet::runDriver();
+  karnet::runDriver(invocation);
 }
 
 int hostEntry() { runMain(argumentCount, argumentVector); }
@@ -107,6 +112,7 @@ int main(int argc, char** argv) {
   // The platform hands the arguments already split; the program's own name is
   // not one of them.
   argumentCount = argc > 0 ? argc - 1 : 0;
+  if (argc > 0 && argv[0] != nullptr) programPath = argv[0];
   argumentVector = argc > 0 ? argv + 1 : argv;
 
   const bool hostMode = karnet::hasHostModeArgument(argumentCount, argumentVector);

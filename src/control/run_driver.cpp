@@ -1,10 +1,12 @@
 #include "control/run_driver.h"
 
+#include <cstdio>
 #include <cstdlib>
 
 #include "analysis/objective_analysis.h"
 #include "control/log.h"
 #include "control/progress.h"
+#include "control/run_summary.h"
 #include "control/signals.h"
 #include "control/termination.h"
 #include "input/bathymetry_scan.h"
@@ -12,6 +14,7 @@
 #include "input/run_initialise.h"
 #include "interp/glo2loc.h"
 #include "interp/interp.h"
+#include "output/result_attributes.h"
 #include "output/result_write.h"
 #include "params/run_parameters.h"
 #include "params/run_settings.h"
@@ -25,13 +28,15 @@ void reportInitError(std::int32_t /*lineNumber*/, const char* message) {
   exitRun(1);
 }
 
-int runPhases() {
+int runPhases(const RunInvocation& invocation, RunSummary* summary) {
   RunState& state = runState();
   const RunSettings& settings = runSettings;
   std::int32_t lastObs = -1, jOff = 0, kOff = 0, lOff = 0;
 
   progressStatus("Scanning data ...");
-  dataScan(state, settings, runParameters.inputFiles.FileName, &lastObs, &jOff, &kOff, &lOff);
+  ObservationTally tally;
+  dataScan(state, settings, runParameters.inputFiles.FileName, &lastObs, &jOff, &kOff, &lOff,
+           &tally);
   progressStatus("Scanning bathymetry ...");
   bathymetryScan(jOff, kOff, lOff, state, settings);
   progressStatus("Initialising ...");
@@ -48,11 +53,18 @@ int runPhases() {
     interp(lastObs, jOff, kOff, lOff, state, settings);
   }
   glo2loc(jOff, kOff, lOff, state, settings);
+  if (summary != nullptr) {
+    summary->resultPath = runParameters.outputData.FileName;
+    summary->observations = tally;
+    countResultNodes(state.bathymetryGrid, state.landValue, settings, state.localValues, summary);
+  }
   progressStatus("Saving data ...");
+  const TextAttributes attributes = resultGlobalAttributes(
+      runParameters, invocation.commandLine, KARNET_VERSION, resultTimestamp());
   const int written =
       resultWrite(runParameters.outputData.FileName, *state.resultDescription, 1,
                   runParameters.outputData.ItemType, state.localValues, settings.projection,
-                  errorField.data != nullptr ? &errorField : nullptr);
+                  &attributes, errorField.data != nullptr ? &errorField : nullptr);
   if (errorField.data != nullptr) grid3DFree(errorField);
   return written;
 }
@@ -64,10 +76,11 @@ void freeRunArrays(RunState& state) {
   state.resultDescription = nullptr;
 }
 
-void runDriver() {
+void runDriver(const RunInvocation& invocation) {
   installSignalHandlers();
   runInitialise(runState(), runSettings);
-  const int written = runPhases();
+  RunSummary summary;
+  const int written = runPhases(invocation, &summary);
   // A run whose result could not be written has not produced what it was for.
   if (written == 0) {
     logWrite("\nERROR while writing result file\n");
@@ -75,6 +88,7 @@ void runDriver() {
   }
   freeRunArrays(runState());
   restoreSignalHandlers();
+  printRunSummary(stderr, summary, invocation.quiet);
   exitRun(0);
 }
 
