@@ -1,9 +1,10 @@
 // The tables of a cross-validation: per level, and per sweep combination.
+#include "control/cross_validate_run.h"
+
+#include <algorithm>
 #include <cstdarg>
 #include <cstdio>
 #include <string>
-
-#include "control/cross_validate_run.h"
 
 namespace karnet {
 namespace {
@@ -72,10 +73,15 @@ std::string cvLevelText(const CvResult& result, const RunSettings& settings) {
 }
 
 std::int64_t bestTrial(const std::vector<CvResult>& results) {
+  // RMS errors over different sets of nodes do not compare: a search radius
+  // that leaves the hard, isolated casts without an estimate would look best.
+  // So only the trials that compared the most nodes compete.
+  std::int64_t most = 0;
+  for (const CvResult& r : results) most = std::max(most, r.overall.nodes);
   std::int64_t best = -1;
   for (std::size_t t = 0; t < results.size(); ++t) {
     const CvStats& overall = results[t].overall;
-    if (overall.nodes == 0) continue;
+    if (overall.nodes == 0 || overall.nodes < most) continue;
     if (best < 0 || overall.rms() < results[static_cast<std::size_t>(best)].overall.rms()) {
       best = static_cast<std::int64_t>(t);
     }
@@ -118,6 +124,13 @@ std::string cvSweepText(const std::vector<CvResult>& results,
                    static_cast<long long>(overall.missed));
     text += textFigures(overall);
     text += static_cast<std::int64_t>(t) == best ? "  <- best\n" : "\n";
+  }
+  for (const CvResult& r : results) {
+    if (r.overall.nodes != results.front().overall.nodes) {
+      text += "The combinations compare different numbers of nodes; the best is the lowest RMS\n"
+              "among those that compare the most.\n";
+      break;
+    }
   }
   return text;
 }

@@ -50,8 +50,8 @@ double sweptValue(const RunSettings& trial, const std::string& name);
 std::string cvLevelCsv(const CvResult& result, const RunSettings& settings);
 // The same as text for the terminal and the log.
 std::string cvLevelText(const CvResult& result, const RunSettings& settings);
-// Index of the trial with the lowest overall RMS among those that compared a
-// node (the first of equals); -1 when none did.
+// Index of the trial with the lowest overall RMS among those that compared
+// the most nodes (the first of equals); -1 when none compared a node.
 std::int64_t bestTrial(const std::vector<CvResult>& results);
 // The sweep table, CSV: one column per swept keyword, then
 // nodes,missed,rms,bias,best ("*" on the best row).

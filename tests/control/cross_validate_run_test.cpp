@@ -147,6 +147,12 @@ TEST(CrossValidationTables, SweepTableMarksTheLowestRms) {
             std::string::npos)
       << text;
   EXPECT_EQ(bestTrial({results[2]}), -1);
+
+  // A trial that left nodes without an estimate does not compete, however low its RMS.
+  results[0].overall = stats(3, 1, 0.0, 0.03);
+  EXPECT_EQ(bestTrial(results), 1);
+  EXPECT_NE(cvSweepText(results, trials, sweep).find("different numbers of nodes"),
+            std::string::npos);
 }
 
 TEST(CrossValidationTables, LieBesideTheParameterFile) {
