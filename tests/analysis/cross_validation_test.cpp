@@ -3,6 +3,7 @@
 
 #include <gtest/gtest.h>
 
+#include <array>
 #include <cmath>
 #include <vector>
 
@@ -135,13 +136,16 @@ TEST(CrossValidation, MatchesFreshEstimatesForEveryTrialWhateverTheThreads) {
   f.settings.SearchRadius = 7.0f;
   f.settings.CorrelationSampleSize = 4;
   // Casts of uneven depth; their values vary with position and level.
-  const std::int32_t positions[][2] = {{1, 1}, {3, 2}, {6, 1}, {2, 6}, {5, 5}, {8, 7},
-                                       {12, 3}, {13, 9}, {9, 12}, {4, 11}, {7, 9}, {15, 13}};
+  // Every second column, rows staggered: several casts within reach of each.
+  std::vector<std::array<std::int32_t, 2>> positions;
+  for (std::int32_t j = 0; j < 16; j += 2) {
+    for (std::int32_t k = (j * 3) % 4; k < 14; k += 4) positions.push_back({j + k % 3 / 2, k});
+  }
   for (const auto& p : positions) {
     const float base = 0.37f * static_cast<float>(p[0]) - 0.21f * static_cast<float>(p[1]);
     f.cast(p[0], p[1], {base + 5.0f, base + 3.0f, base});
   }
-  f.values[f.at(12, 3, 2)] = kHole;  // a cast that ends before the last level
+  f.values[f.at(positions[5][0], positions[5][1], 2)] = kHole;  // a cast ending a level early
   std::vector<RunSettings> trials;
   for (float decay : {2.0f, 4.0f}) {
     for (float error : {1.0f, 30.0f}) {
@@ -150,6 +154,9 @@ TEST(CrossValidation, MatchesFreshEstimatesForEveryTrialWhateverTheThreads) {
       trials.back().ErrorVariance = error;
     }
   }
+  // A short reach: the selection visits only the columns next to the node.
+  trials.push_back(f.settings);
+  trials.back().SearchRadius = 3.0f;
   const std::vector<CvResult> one = f.run(trials, 1);
   const std::vector<CvResult> three = f.run(trials, 3);
   ASSERT_EQ(one.size(), trials.size());
