@@ -54,17 +54,31 @@ bool validatedNode(const CvInput& input, const Footprint& f, std::int32_t j, std
   return !isDryCell(valueAt(*input.bathymetry, j, k, l), input.landValue);
 }
 
-// Whether layer l has a node to validate.
-bool layerHasWork(const CvInput& input, const Footprint& f, std::int32_t l) {
-  if (!layerInside(*input.values, l)) return false;
-  const std::int32_t jEnd = std::min(f.jLast, input.values->nj - 1);
-  const std::int32_t kEnd = std::min(f.kLast, input.values->nk - 1);
-  for (std::int32_t j = std::max(f.jFirst, 0); j <= jEnd; ++j) {
-    for (std::int32_t k = std::max(f.kFirst, 0); k <= kEnd; ++k) {
-      if (validatedNode(input, f, j, k, l)) return true;
+// The data cells of one layer in the order the analysis collects them (x
+// outer, y inner), gathered once and shared by every trial.
+struct LayerCells {
+  std::int32_t l = 0;
+  std::vector<float> x, y, value;
+};
+
+// The cells of layer l, or nothing when no node of the layer is validated.
+bool collectLayer(const CvInput& input, const Footprint& f, std::int32_t l, LayerCells& cells) {
+  const FloatGrid3D& values = *input.values;
+  if (!layerInside(values, l)) return false;
+  const float* layer = values.data + std::int64_t{l} * values.nj * values.nk;
+  bool validated = false;
+  cells.l = l;
+  for (std::int32_t j = 0; j < values.nj; ++j) {
+    for (std::int32_t k = 0; k < values.nk; ++k) {
+      const float v = layer[std::int64_t{k} * values.nj + j];
+      if (isEmptyCell(v, input.deleteValue)) continue;
+      cells.x.push_back(static_cast<float>(j));
+      cells.y.push_back(static_cast<float>(k));
+      cells.value.push_back(v);
+      validated = validated || validatedNode(input, f, j, k, l);
     }
   }
-  return false;
+  return validated;
 }
 
 // Takes data cell i out of the workspace's cells (kept in column order, so the
@@ -108,35 +122,21 @@ void putBack(OaWorkspace& ws, std::int32_t i, const LeftOut& cell) {
 }
 
 // One layer of one trial: every validated data node estimated without its cast.
-CvStats validateLayer(const CvInput& input, const RunSettings& s, std::int32_t l) {
-  const FloatGrid3D& values = *input.values;
-  const std::int32_t nj = values.nj;
-  const std::int32_t nk = values.nk;
+CvStats validateLayer(const CvInput& input, const RunSettings& s, const LayerCells& cells) {
+  const std::int32_t nj = input.values->nj;
+  const std::int32_t nk = input.values->nk;
+  const std::int32_t l = cells.l;
   const Footprint f = footprintOf(input, s);
-  const float* layer = values.data + std::int64_t{l} * nj * nk;
-
-  std::int32_t nData = 0;
-  for (std::int64_t c = 0; c < std::int64_t{nj} * nk; ++c) {
-    if (!isEmptyCell(layer[c], input.deleteValue)) ++nData;
-  }
+  const auto n = static_cast<std::int32_t>(cells.value.size());
 
   OaWorkspace ws;
   {
     const std::lock_guard<std::mutex> lock(allocatorMutex);
-    workspaceSetUp(ws, nData, nj, nk, s);
+    workspaceSetUp(ws, n, nj, nk, s);
   }
-  // The layer's cells in the order the analysis collects them: x outer, y inner.
-  std::int32_t n = 0;
-  for (std::int32_t j = 0; j < nj; ++j) {
-    for (std::int32_t k = 0; k < nk; ++k) {
-      const float v = layer[std::int64_t{k} * nj + j];
-      if (isEmptyCell(v, input.deleteValue)) continue;
-      ws.dataX[n] = static_cast<float>(j);
-      ws.dataY[n] = static_cast<float>(k);
-      ws.dataValue[n] = v;
-      ++n;
-    }
-  }
+  std::copy(cells.x.begin(), cells.x.end(), ws.dataX);
+  std::copy(cells.y.begin(), cells.y.end(), ws.dataY);
+  std::copy(cells.value.begin(), cells.value.end(), ws.dataValue);
   ws.dataCount = n;
   {
     const std::lock_guard<std::mutex> lock(allocatorMutex);
@@ -175,7 +175,7 @@ CvStats validateLayer(const CvInput& input, const RunSettings& s, std::int32_t l
 
 struct Task {
   std::size_t trial = 0;
-  std::int32_t l = 0;
+  std::size_t layer = 0;  // into the gathered layers
   CvStats stats;
 };
 
@@ -216,15 +216,21 @@ std::int64_t countValidatedCasts(const CvInput& input, const RunSettings& settin
 std::vector<CvResult> crossValidate(const CvInput& input, const std::vector<RunSettings>& trials,
                                     std::int32_t threads) {
   std::vector<CvResult> results(trials.size());
+  if (trials.empty()) return results;
+  // The trials differ in the analysis' keywords only, never in the grid: one
+  // footprint, and one gathering of each layer's cells, serve them all.
+  const Footprint f = footprintOf(input, trials.front());
+  std::vector<LayerCells> layers;
+  for (std::int32_t l = f.lFirst; l <= f.lLast; ++l) {
+    LayerCells cells;
+    if (collectLayer(input, f, l, cells)) layers.push_back(std::move(cells));
+  }
   std::vector<Task> tasks;
   for (std::size_t t = 0; t < trials.size(); ++t) {
     const RunSettings& s = trials[t];
-    const Footprint f = footprintOf(input, s);
     results[t].firstLevel = s.l0;
     results[t].levels.assign(static_cast<std::size_t>(std::max(s.lx - s.l0 + 1, 0)), CvStats{});
-    for (std::int32_t l = f.lFirst; l <= f.lLast; ++l) {
-      if (layerHasWork(input, f, l)) tasks.push_back(Task{t, l, CvStats{}});
-    }
+    for (std::size_t i = 0; i < layers.size(); ++i) tasks.push_back(Task{t, i, CvStats{}});
   }
 
   // Workers take the next task in turn; each task's result has its own slot,
@@ -232,7 +238,7 @@ std::vector<CvResult> crossValidate(const CvInput& input, const std::vector<RunS
   std::atomic<std::size_t> next{0};
   auto work = [&]() {
     for (std::size_t i = next++; i < tasks.size(); i = next++) {
-      tasks[i].stats = validateLayer(input, trials[tasks[i].trial], tasks[i].l);
+      tasks[i].stats = validateLayer(input, trials[tasks[i].trial], layers[tasks[i].layer]);
     }
   };
   const std::size_t workers =
@@ -247,7 +253,7 @@ std::vector<CvResult> crossValidate(const CvInput& input, const std::vector<RunS
 
   for (const Task& task : tasks) {
     CvResult& r = results[task.trial];
-    const std::int32_t level = task.l - input.lOff;  // index from the first local level
+    const std::int32_t level = layers[task.layer].l - input.lOff;  // from the first local level
     r.levels[static_cast<std::size_t>(level)].add(task.stats);
     r.overall.add(task.stats);
   }
