@@ -149,6 +149,9 @@ CvStats validateLayer(const CvInput& input, const RunSettings& s, const LayerCel
     const auto k = static_cast<std::int32_t>(ws.dataY[i]);
     if (!validatedNode(input, f, j, k, l)) continue;
     const LeftOut cell = leaveOut(ws, i);
+    // The selection's column cursors hold entry numbers of the previous node's
+    // cells, which taking a cell out has moved: each node searches afresh.
+    ws.cursorJ = -1;
     const std::int32_t m = selectData(ws, j, k, s);
     float estimate = 0.0f;
     const bool made = OBJAN(ws, m, &estimate, s) == 0 && !std::isnan(estimate);
