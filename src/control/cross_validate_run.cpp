@@ -216,6 +216,15 @@ bool takeCrossValidationArguments(int& count, char** arguments, CrossValidationR
     arguments[kept++] = arguments[i];
   }
   count = kept;
+  // "--sweep A=1,2 B=3" without a parameter file would take "B=3" for one.
+  if (!request.sweep.empty() && count > 0) {
+    const std::string last = arguments[count - 1];
+    const std::size_t equals = last.find('=');
+    if (equals != std::string::npos && findKeyword(last.substr(0, equals)) != nullptr) {
+      error = "--sweep: the parameter file must be the last argument, after '" + last + "'";
+      return false;
+    }
+  }
   std::size_t combinations = 1;
   for (const SweepKeyword& keyword : request.sweep) {
     combinations *= keyword.values.size();

@@ -65,6 +65,7 @@ TEST(CrossValidationArguments, MalformedRequestsAreRefusedWithTheReason) {
       {{"--sweep", "SearchRadius=-1", "case.pfs"}, "at least 0"},
       {{"--sweep", "MinData=nan", "case.pfs"}, "finite number"},
       {{"--sweep", "ErrorVariance=1", "errorvariance=2", "case.pfs"}, "given twice"},
+      {{"--sweep", "DecayDistance=1,2", "ErrorVariance=3"}, "parameter file must be the last"},
       {{"--sweep", "DecayDistance=" + thirtyTwo, "ErrorVariance=" + thirtyTwo, "case.pfs"},
        "more than 1000 combinations"},
   };
