@@ -5,6 +5,7 @@
 #include <atomic>
 #include <cmath>
 #include <cstring>
+#include <exception>
 #include <mutex>
 #include <thread>
 
@@ -237,11 +238,20 @@ std::vector<CvResult> crossValidate(const CvInput& input, const std::vector<RunS
   }
 
   // Workers take the next task in turn; each task's result has its own slot,
-  // and the slots are summed in task order afterwards.
+  // and the slots are summed in task order afterwards. The first error of any
+  // worker stops the others and is thrown again here, on the calling thread.
   std::atomic<std::size_t> next{0};
+  std::mutex errorMutex;
+  std::exception_ptr error;
   auto work = [&]() {
-    for (std::size_t i = next++; i < tasks.size(); i = next++) {
-      tasks[i].stats = validateLayer(input, trials[tasks[i].trial], layers[tasks[i].layer]);
+    try {
+      for (std::size_t i = next++; i < tasks.size(); i = next++) {
+        tasks[i].stats = validateLayer(input, trials[tasks[i].trial], layers[tasks[i].layer]);
+      }
+    } catch (...) {
+      const std::lock_guard<std::mutex> lock(errorMutex);
+      if (error == nullptr) error = std::current_exception();
+      next = tasks.size();
     }
   };
   const std::size_t workers =
@@ -253,6 +263,7 @@ std::vector<CvResult> crossValidate(const CvInput& input, const std::vector<RunS
     for (std::size_t w = 0; w < workers; ++w) pool.emplace_back(work);
     for (std::thread& t : pool) t.join();
   }
+  if (error != nullptr) std::rethrow_exception(error);
 
   for (const Task& task : tasks) {
     CvResult& r = results[task.trial];
