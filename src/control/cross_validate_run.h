@@ -6,21 +6,10 @@
 #include <vector>
 
 #include "analysis/cross_validation.h"
+#include "control/cross_validate_request.h"
 #include "params/run_settings.h"
 
 namespace karnet {
-
-// One keyword of the objective analysis and the values a sweep tries for it.
-struct SweepKeyword {
-  std::string name;            // as the parameter file spells it
-  std::vector<double> values;  // in the order given
-};
-
-// What the command line asks of a cross-validation.
-struct CrossValidationRequest {
-  bool active = false;              // --cross-validate or --sweep given
-  std::vector<SweepKeyword> sweep;  // empty: the parameter file's values only
-};
 
 // Most combinations one sweep may ask for.
 inline constexpr std::size_t kMaxSweepCombinations = 1000;
