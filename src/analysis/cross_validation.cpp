@@ -254,8 +254,11 @@ std::vector<CvResult> crossValidate(const CvInput& input, const std::vector<RunS
       next = tasks.size();
     }
   };
-  const std::size_t workers =
-      std::min<std::size_t>(static_cast<std::size_t>(std::max(threads, 1)), tasks.size());
+  // Each worker's workspace holds some twenty blocks of the checked
+  // allocator, whose table has room for 512 live blocks in all.
+  constexpr std::int32_t kMaxWorkers = 16;
+  const std::size_t workers = std::min<std::size_t>(
+      static_cast<std::size_t>(std::clamp(threads, 1, kMaxWorkers)), tasks.size());
   if (workers <= 1) {
     work();
   } else {

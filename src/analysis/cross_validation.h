@@ -53,8 +53,8 @@ struct CvInput {
 // gridded value is gathered per level. Only the layers and nodes that hold
 // data of a cast are estimated, never a whole layer.
 //
-// The work is shared among up to `threads` threads (layers and trials are
-// independent); the results do not depend on the number of threads.
+// The work is shared among up to `threads` threads, at most 16 (layers and
+// trials are independent); the results do not depend on the number of threads.
 std::vector<CvResult> crossValidate(const CvInput& input, const std::vector<RunSettings>& trials,
                                     std::int32_t threads);
 

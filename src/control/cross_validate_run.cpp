@@ -6,6 +6,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cmath>
 #include <cstdio>
@@ -144,8 +145,7 @@ void setKeyword(RunSettings& s, const std::string& name, double value) {
 }
 
 // Threads for the cross-validation: OMP_NUM_THREADS when it names a count
-// (the same setting as the analysis' threads), else the processors; at most
-// 16, which keeps the allocator's table of live blocks far from full.
+// (the same setting as the analysis' threads), else the processors.
 std::int32_t threadCount() {
   long threads = static_cast<long>(std::thread::hardware_concurrency());
   if (const char* text = std::getenv("OMP_NUM_THREADS"); text != nullptr) {
@@ -153,8 +153,7 @@ std::int32_t threadCount() {
     const long asked = std::strtol(text, &end, 10);
     if (end != text && asked > 0) threads = asked;
   }
-  if (threads < 1) threads = 1;
-  return static_cast<std::int32_t>(threads > 16 ? 16 : threads);
+  return static_cast<std::int32_t>(std::clamp<long>(threads, 1, 1024));
 }
 
 // Writes text to path through a temporary file in the same directory, so that
