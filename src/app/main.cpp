@@ -13,11 +13,12 @@
 #include "control/log.h"
 #include "control/run_driver.h"
 #include "control/termination.h"
-#include "params/run_setup.h"
+#include "control/threads.h"
 
 namespace {
 
 constexpr char kUsage[] = "Usage: karnet.exe [//apv] [options] pfs-file";
+constexpr char kThreadsError[] = "--threads and KARNET_THREADS take a number from 1 to 4096";
 
 constexpr char kHelp[] =
     "\n"
@@ -29,6 +30,9 @@ constexpr char kHelp[] =
     "Options:\n"
     "  //apv      run under the progress display; q or SIGUSR1 cancels the run\n"
     "  -debug     accepted, without effect\n"
+    "  --threads N\n"
+    "             threads of the computation (default: KARNET_THREADS, else all\n"
+    "             cores); the result is the same for any number\n"
     "  --help     this text\n"
     "  --version  the program's version\n"
     "\n"
@@ -54,8 +58,13 @@ char** argumentVector = nullptr;
 [[noreturn]] void runMain(int count, char** arguments) {
   char parameterFile[karnet::kFileNameSize];
   if (karnet::selectParameterFile(count, arguments, parameterFile) == 0) {
-    karnet::fatalError(kUsage);
+    karnet::endRun(karnet::RunError::fatal(kUsage));
   }
+  int threads = 0;
+  if (karnet::selectThreadCount(count, arguments, std::getenv("KARNET_THREADS"), &threads) == 0) {
+    karnet::endRun(karnet::RunError::fatal(kThreadsError));
+  }
+  if (threads == 0) threads = karnet::defaultThreadCount();
 
   char logFileName[karnet::kFileNameSize];
   std::FILE* log = nullptr;
@@ -67,8 +76,7 @@ char** argumentVector = nullptr;
   if (log != nullptr) std::setvbuf(log, nullptr, _IOLBF, 0);
   karnet::logSetStream(log != nullptr ? log : stderr);
 
-  karnet::setupRun(parameterFile);
-  karnet::runDriver();
+  karnet::runProgram(parameterFile, threads);
 }
 
 int hostEntry() { runMain(argumentCount, argumentVector); }

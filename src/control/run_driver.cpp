@@ -1,48 +1,89 @@
 #include "control/run_driver.h"
 
 #include <cstdlib>
+#include <new>
+#include <stdexcept>
 
 #include "analysis/objective_analysis.h"
 #include "control/log.h"
 #include "control/progress.h"
 #include "control/signals.h"
 #include "control/termination.h"
+#include "input/bathymetry_read.h"
 #include "input/bathymetry_scan.h"
 #include "input/data_scan.h"
 #include "input/run_initialise.h"
 #include "interp/glo2loc.h"
 #include "interp/interp.h"
 #include "output/result_write.h"
-#include "params/run_parameters.h"
-#include "params/run_settings.h"
-#include "state/run_state.h"
+#include "params/run_setup.h"
+#include "state/run_context.h"
+#include "support/run_error.h"
 
 namespace karnet {
+namespace {
 
-void reportInitError(std::int32_t /*lineNumber*/, const char* message) {
-  logPrintf("\nERROR: %s\n", message);
-  exitRun(1);
+struct DescriptionDeleter {
+  void operator()(FileDescription* description) const { descriptionFree(description); }
+};
+
+RunContext contextOf(Run& run) {
+  return RunContext{run.settings, runLog(), run.cartography.get(), run.threads};
 }
 
-int runPhases() {
-  RunState& state = runState();
-  const RunSettings& settings = runSettings;
+}  // namespace
+
+void setupRun(const char* parameterFile, Run& run) {
+  if (readParameterFile(parameterFile, run.parameters) == 0) {
+    throw RunError::fatal("Error in parameter file");
+  }
+
+  std::unique_ptr<FileDescription, DescriptionDeleter> bathymetry(descriptionNew(2));
+  if (bathymetry == nullptr) throw RunError::fatal("Unable to allocate memory");
+  // A file that cannot be read leaves the description at its creation values,
+  // which the validation below rejects.
+  bathymetryRead(run.parameters.inputFiles.FileName, *bathymetry, 1, run.state.bathymetryGrid);
+  deriveSettings(run.parameters, *bathymetry, run.settings);
+  run.state.landValue = run.settings.landValue;
+
+  char message[1024];
+  if (checkRunSettings(run.parameters, run.settings, message, sizeof message) == 0) {
+    throw RunError::fatal(message);
+  }
+
+  // One projection object serves the whole run: its conversions do not depend
+  // on the position it was placed at.
+  const double longitude = bathymetry->axes[1].origin;
+  const double latitude = bathymetry->axes[2].origin;
+  try {
+    run.cartography = std::make_unique<Cartography>(run.settings.projection, longitude, latitude,
+                                                    run.settings.orientation);
+  } catch (const std::runtime_error&) {
+    throw RunError::fatal("Unable to initialize geo. system");
+  }
+  run.cartography->geoToProj(longitude, latitude, &run.settings.xOrigo, &run.settings.yOrigo);
+}
+
+int runPhases(Run& run) {
+  RunState& state = run.state;
+  const RunContext context = contextOf(run);
+  const RunSettings& settings = run.settings;
   std::int32_t lastObs = -1, jOff = 0, kOff = 0, lOff = 0;
 
   progressStatus("Scanning data ...");
-  dataScan(state, settings, runParameters.inputFiles.FileName, &lastObs, &jOff, &kOff, &lOff);
+  dataScan(state, context, run.parameters.inputFiles.FileName, &lastObs, &jOff, &kOff, &lOff);
   progressStatus("Scanning bathymetry ...");
   bathymetryScan(jOff, kOff, lOff, state, settings);
   progressStatus("Initialising ...");
   if (settings.Analysis == 0) {
-    objectiveAnalysis(lastObs, jOff, kOff, lOff, state, settings);
+    objectiveAnalysis(lastObs, jOff, kOff, lOff, state, context);
   } else {
-    interp(lastObs, jOff, kOff, lOff, state, settings);
+    interp(lastObs, jOff, kOff, lOff, state, context);
   }
   glo2loc(jOff, kOff, lOff, state, settings);
   progressStatus("Saving data ...");
-  return resultWrite(runParameters.outputData.FileName, *state.resultDescription, 1,
-                     runParameters.outputData.ItemType, state.localValues, settings.projection);
+  return resultWrite(run.parameters.outputData.FileName, *state.resultDescription, 1,
+                     run.parameters.outputData.ItemType, state.localValues, settings.projection);
 }
 
 void freeRunArrays(RunState& state) {
@@ -52,17 +93,27 @@ void freeRunArrays(RunState& state) {
   state.resultDescription = nullptr;
 }
 
-void runDriver() {
+void runDriver(Run& run) {
   installSignalHandlers();
-  runInitialise(runState(), runSettings);
-  const int written = runPhases();
+  runInitialise(run.state, contextOf(run));
   // A run whose result could not be written has not produced what it was for.
-  if (written == 0) {
-    logWrite("\nERROR while writing result file\n");
-    exitRun(1);
-  }
-  freeRunArrays(runState());
+  if (runPhases(run) == 0) throw RunError::logged("\nERROR while writing result file\n");
+  freeRunArrays(run.state);
   restoreSignalHandlers();
+}
+
+void runProgram(const char* parameterFile, int threads) {
+  try {
+    // Lives until the process ends: exitRun leaves without unwinding.
+    static Run run;
+    run.threads = threads > 0 ? threads : 1;
+    setupRun(parameterFile, run);
+    runDriver(run);
+  } catch (const RunError& error) {
+    endRun(error);
+  } catch (const std::bad_alloc&) {
+    endRun(RunError::memory("Memory exhausted\n"));
+  }
   exitRun(0);
 }
 

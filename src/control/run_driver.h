@@ -1,25 +1,45 @@
 #ifndef KARNET_CONTROL_RUN_DRIVER_H_
 #define KARNET_CONTROL_RUN_DRIVER_H_
 
-#include <cstdint>
+#include <memory>
+
+#include "input/cartography.h"
+#include "params/run_parameters.h"
+#include "params/run_settings.h"
+#include "state/run_state.h"
 
 namespace karnet {
 
-struct RunState;
+// Everything one run holds from its setup to its end. The driver owns it; the
+// phases get the arrays by reference and the rest through a RunContext.
+struct Run {
+  RunParameters parameters{};
+  RunSettings settings;
+  std::unique_ptr<Cartography> cartography;
+  RunState state;
+  int threads = 1;
+};
 
-// Installs the signal handlers, initialises the run, runs the phases, frees the
-// run arrays and ends the process ("Successful", exit code 0). Every error ends
-// the process from where it occurs.
-[[noreturn]] void runDriver();
+// Reads the parameter file and the bathymetry header, derives and validates
+// the settings and places the map projection at the bathymetry origin.
+// Throws a RunError on failure.
+void setupRun(const char* parameterFile, Run& run);
 
-// Scanning, bathymetry scan, interpolation, extraction and result file, in order.
-// Returns the result writer's result.
-int runPhases();
+// Installs the signal handlers, initialises the run, runs the phases, frees
+// the run arrays and restores the handlers. Throws a RunError on failure.
+void runDriver(Run& run);
+
+// Scanning, bathymetry scan, interpolation, extraction and result file, in
+// order. Returns the result writer's result.
+int runPhases(Run& run);
 
 void freeRunArrays(RunState& state);
 
-// "\nERROR: %s\n" to the log, then exitRun(1).
-[[noreturn]] void reportInitError(std::int32_t lineNumber, const char* message);
+// The whole run of a parameter file with the given number of threads: setup
+// and driver, then the end of the process, "Successful" with exit code 0 or,
+// for an error thrown anywhere below, its log lines, message and exit code.
+// The one place where a run ends.
+[[noreturn]] void runProgram(const char* parameterFile, int threads);
 
 }  // namespace karnet
 

@@ -6,14 +6,15 @@
 namespace karnet {
 
 struct RunState;
-struct RunSettings;
+struct RunContext;
 
 // Reads and rotates the observations into the grid frame, lays the basic grid
 // over the observations and the local grid, converts the observations to
 // basic-grid units, allocates the basic-grid fields and logs the basic grid.
 // Hands back the last observation's index and the basic node of the local
-// grid's first node. Ends the run itself on failure.
-void dataScan(RunState& state, const RunSettings& settings, const char* bathymetryFile,
+// grid's first node. On failure releases the run's arrays (releaseAll) and
+// throws a RunError for the log.
+void dataScan(RunState& state, const RunContext& context, const char* bathymetryFile,
               std::int32_t* lastObs, std::int32_t* jOff, std::int32_t* kOff,
               std::int32_t* lOff);
 

@@ -10,11 +10,6 @@ double RunState::deleteValue() const {
                                       : static_cast<double>(kDeleteValueFloat);
 }
 
-RunState& runState() {
-  static RunState state;
-  return state;
-}
-
 bool scatterDataAlloc(ScatterData& scatter, std::int64_t count) {
   scatterDataFree(scatter);
   if (count < 0) return false;

@@ -19,9 +19,9 @@ struct ScatterData {
   std::int64_t capacity = 0;  // entries allocated in each array
 };
 
-// The run-wide arrays and grids that the phases share. One instance lives for
-// the process (runState()); kernels take it by reference so that tests can
-// build their own.
+// The run-wide arrays and grids that the phases share. The run driver owns the
+// run's one instance; kernels take it by reference so that tests can build
+// their own.
 struct RunState {
   ScatterData scatter;
   FloatGrid2D bathymetryGrid;
@@ -37,8 +37,6 @@ struct RunState {
   // Delete value of the result description (the float -1e-30 widened).
   double deleteValue() const;
 };
-
-RunState& runState();
 
 // Releases everything allocated so far (grids, observations, result description);
 // what was never allocated is skipped, nothing is released twice.

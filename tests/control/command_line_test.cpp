@@ -26,6 +26,10 @@ TEST(CommandLineTest, ModeAndParameterFileFollowTheArguments) {
       {{}, false, 0, ""},
       {{fits}, false, 1, fits},
       {{fits + "p"}, false, 0, fits},
+      // A thread count and its value are no parameter file.
+      {{"--threads", "4", "case.pfs"}, false, 1, "case.pfs"},
+      {{"--THREADS=4", "//apv", "case.pfs"}, true, 1, "case.pfs"},
+      {{"case.pfs", "--threads", "4"}, false, 0, "case.pfs"},
   };
   for (const Case& c : cases) {
     std::vector<const char*> arguments;
@@ -37,6 +41,45 @@ TEST(CommandLineTest, ModeAndParameterFileFollowTheArguments) {
     std::memset(name, 'x', sizeof name);
     EXPECT_EQ(selectParameterFile(count, arguments.data(), name), c.valid);
     EXPECT_EQ(std::string(name), c.name);
+  }
+}
+
+TEST(CommandLineTest, ThreadCountFromTheSwitchElseTheEnvironment) {
+  const struct {
+    std::vector<std::string> arguments;
+    const char* environment;
+    int valid;
+    int threads;  // 0: neither names one
+  } cases[] = {
+      {{"case.pfs"}, nullptr, 1, 0},
+      {{"case.pfs"}, "", 1, 0},
+      {{"case.pfs"}, "6", 1, 6},
+      {{"--threads", "3", "case.pfs"}, "6", 1, 3},
+      {{"--threads=2", "--threads", "5", "case.pfs"}, nullptr, 1, 5},  // the last one counts
+      {{"--threads=4096", "case.pfs"}, nullptr, 1, 4096},
+      // Anything but a whole number 1..4096 is refused, also when the switch wins.
+      {{"--threads", "0", "case.pfs"}, nullptr, 0, 0},
+      {{"--threads=4097", "case.pfs"}, nullptr, 0, 0},
+      {{"--threads=", "case.pfs"}, nullptr, 0, 0},
+      {{"--threads", "+2", "case.pfs"}, nullptr, 0, 0},
+      {{"case.pfs", "--threads"}, "2", 0, 0},
+      {{"case.pfs"}, "2 ", 0, 0},
+      {{"case.pfs"}, "-1", 0, 0},
+      {{"--threads", "3", "case.pfs"}, "junk", 1, 3},
+  };
+  for (const auto& c : cases) {
+    std::vector<const char*> arguments;
+    std::string joined;
+    for (const std::string& argument : c.arguments) {
+      arguments.push_back(argument.c_str());
+      joined += argument + " ";
+    }
+    SCOPED_TRACE(joined + (c.environment != nullptr ? c.environment : "(unset)"));
+    int threads = -1;
+    EXPECT_EQ(selectThreadCount(static_cast<int>(arguments.size()), arguments.data(),
+                                c.environment, &threads),
+              c.valid);
+    EXPECT_EQ(threads, c.threads);
   }
 }
 
