@@ -3,6 +3,7 @@
 # tests again with AddressSanitizer and UndefinedBehaviorSanitizer (in build-sanitize/) and
 # runs them there too. Exit status 0 only when both pass.
 #   KARNET_NO_SANITIZE=1 scripts/test.sh   skips the sanitizer build.
+#   KARNET_TSAN=1 scripts/test.sh          also runs the threaded tests under ThreadSanitizer.
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
@@ -20,5 +21,12 @@ if [ "${KARNET_NO_SANITIZE:-0}" != "1" ]; then
   # there would only replace the exit codes that the tests check.
   (cd build-sanitize && ASAN_OPTIONS=detect_leaks=0 \
      UBSAN_OPTIONS=print_stacktrace=1:halt_on_error=1 ctest --output-on-failure -j "$jobs")
+fi
+if [ "${KARNET_TSAN:-0}" = "1" ]; then
+  # Only the threaded kernel tests, so that this stays short.
+  CC=clang CXX=clang++ cmake -S . -B build-tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo -DKARNET_TSAN=ON \
+    -DKARNET_BUILD_TESTS=ON
+  cmake --build build-tsan -j "$jobs" --target test_interp_threads test_analysis_threads
+  (cd build-tsan && ctest --output-on-failure -j "$jobs" -L threads -R "interp_threads|analysis_threads")
 fi
 echo "test.sh: all tests passed"
