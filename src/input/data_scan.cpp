@@ -257,12 +257,6 @@ void dataScan(RunState& state, const RunContext& context, const char* bathymetry
     g->total = std::int64_t{nj} * nk * nl;
     grid3DAlloc(*g);
   }
-  for (FloatGrid2D* g : {&state.layerBathymetry, &state.layerValues}) {
-    *g = FloatGrid2D{};
-    g->nj = nj;
-    g->nk = nk;
-    grid2DAlloc(*g);
-  }
 
   report.write("\nBasic grid parameters:\n");
   report.write("\n");

@@ -41,8 +41,6 @@ void releaseAll(RunState& state) {
   grid3DFree(state.basicBathymetry);
   grid3DFree(state.basicValues);
   grid3DFree(state.localValues);
-  grid2DFree(state.layerBathymetry);
-  grid2DFree(state.layerValues);
   grid2DFree(state.bathymetryGrid);
   scatterDataFree(state.scatter);
   descriptionFree(state.resultDescription);

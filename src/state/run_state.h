@@ -21,14 +21,13 @@ struct ScatterData {
 
 // The run-wide arrays and grids that the phases share. The run driver owns the
 // run's one instance; kernels take it by reference so that tests can build
-// their own.
+// their own. The work layers of the layer passes are not here: each thread
+// that analyses a layer has its own.
 struct RunState {
   ScatterData scatter;
   FloatGrid2D bathymetryGrid;
   FloatGrid3D basicBathymetry;
   FloatGrid3D basicValues;
-  FloatGrid2D layerBathymetry;
-  FloatGrid2D layerValues;
   FloatGrid3D localValues;
   FileDescription* resultDescription = nullptr;
   std::FILE* observationFile = nullptr;

@@ -34,10 +34,6 @@ class TestRun {
       *g = FloatGrid3D{0, 0, 0, nj, nk, nl, 1, 1, 1, std::int64_t{nj} * nk * nl, nullptr};
       grid3DAlloc(*g);
     }
-    for (FloatGrid2D* g : {&state.layerValues, &state.layerBathymetry}) {
-      *g = FloatGrid2D{0, 0, nj, nk, nullptr};
-      grid2DAlloc(*g);
-    }
     grid3DFill(state.basicBathymetry, bed);
     state.landValue = kLand;
     settings.jx = nj - 1;
