@@ -10,11 +10,28 @@ namespace karnet {
 int defaultThreadCount() { return std::max(omp_get_max_threads(), 1); }
 
 ThreadShare shareThreads(int threads, long long layerCount) {
-  ThreadShare share;
   threads = std::max(threads, 1);
-  share.layers = static_cast<int>(std::clamp<long long>(layerCount, 1, threads));
-  share.rows = std::max(threads / share.layers, 1);
-  return share;
+  layerCount = std::max(layerCount, 1LL);
+  // With `layers` layer threads the pass takes ceil(layerCount / layers)
+  // rounds, each as long as a layer on `rows` threads. A layer has a part that
+  // one thread does (copies, count table, smoothing, write-back), taken as a
+  // tenth of it. The share with the shortest pass wins, and of equal ones that
+  // with more layer threads.
+  constexpr double kSerialPart = 0.1;
+  ThreadShare best;
+  double bestTime = static_cast<double>(layerCount);  // one thread: every layer in turn
+  const int most = static_cast<int>(std::min<long long>(threads, layerCount));
+  for (int layers = 1; layers <= most; ++layers) {
+    const int rows = threads / layers;
+    const long long rounds = (layerCount + layers - 1) / layers;
+    const double time =
+        static_cast<double>(rounds) * (kSerialPart + (1.0 - kSerialPart) / rows);
+    if (time <= bestTime * (1.0 + 1e-9)) {
+      best = ThreadShare{layers, rows};
+      bestTime = time;
+    }
+  }
+  return best;
 }
 
 void allowNestedTeams() {

@@ -10,7 +10,8 @@ int defaultThreadCount();
 // How a loop over layers shares threads: `layers` threads each take whole
 // layers, and each of them leads `rows` threads over the rows of its layer.
 // layers * rows never exceeds threads; a run of few layers (one, say) still
-// uses every thread on the rows.
+// uses every thread on the rows. The share is the one with the shortest pass
+// when a tenth of each layer's work is done by one thread.
 struct ThreadShare {
   int layers = 1;
   int rows = 1;

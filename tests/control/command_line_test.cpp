@@ -1,5 +1,6 @@
 // Run mode, parameter file and log file name from the command-line arguments.
 #include "control/command_line.h"
+#include "control/threads.h"
 
 #include <gtest/gtest.h>
 
@@ -80,6 +81,25 @@ TEST(CommandLineTest, ThreadCountFromTheSwitchElseTheEnvironment) {
                                 c.environment, &threads),
               c.valid);
     EXPECT_EQ(threads, c.threads);
+  }
+}
+
+TEST(ThreadShareTest, LayersFirstAndRowsForWhatLayersCannotUse) {
+  const struct {
+    int threads;
+    long long layers;
+    int layerThreads, rowThreads;
+  } cases[] = {
+      {1, 10, 1, 1},   {2, 10, 2, 1},   {7, 20, 7, 1},   {7, 10, 7, 1},
+      {8, 1, 1, 8},    // one level: every thread on its rows
+      {7, 3, 3, 2},    // three layers of two threads each, one thread idle
+      {16, 10, 5, 3},  // two rounds on three threads beat one round on one
+      {4, 0, 1, 4},    {0, 5, 1, 1},
+  };
+  for (const auto& c : cases) {
+    const ThreadShare share = shareThreads(c.threads, c.layers);
+    EXPECT_EQ(share.layers, c.layerThreads) << c.threads << " threads, " << c.layers << " layers";
+    EXPECT_EQ(share.rows, c.rowThreads) << c.threads << " threads, " << c.layers << " layers";
   }
 }
 
