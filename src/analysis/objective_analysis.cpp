@@ -272,9 +272,12 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
 #pragma omp parallel num_threads(share.layers) if (share.layers > 1)
   {
     std::optional<LayerWorkspace> ws;
-#pragma omp for schedule(dynamic, 1)
+#pragma omp for schedule(dynamic, 1) nowait
     for (std::int64_t s = 0; s < layerCount; ++s) {
-      if (progress.stopped()) continue;
+      if (progress.stopped()) {
+        progress.itemDone();
+        continue;
+      }
       const auto l = static_cast<std::int32_t>(lOff + s);
       LayerOutcome& outcome = outcomes[static_cast<std::size_t>(s)];
       try {
@@ -312,8 +315,10 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
       } catch (...) {
         progress.fail(std::current_exception(), s);
       }
+      progress.itemDone();
       progress.poll();
     }
+    progress.watchUntilDone(layerCount);
   }
   progress.finish();
 

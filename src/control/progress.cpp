@@ -2,6 +2,7 @@
 // and the cancel question.
 #include "control/progress.h"
 
+#include <chrono>
 #include <cmath>
 #include <ctime>
 
@@ -99,6 +100,14 @@ void WorkProgress::poll() {
   } catch (...) {
     // A cancel or an interrupt comes before any error a worker may still meet.
     fail(std::current_exception(), INT64_MIN);
+  }
+}
+
+void WorkProgress::watchUntilDone(std::int64_t items) {
+  if (std::this_thread::get_id() != driver_) return;
+  while (items_.load(std::memory_order_relaxed) < items) {
+    poll();
+    std::this_thread::sleep_for(std::chrono::milliseconds(20));
   }
 }
 

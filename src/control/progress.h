@@ -49,12 +49,19 @@ class WorkProgress {
   // Shows the count and asks whether to stop; does nothing on other threads
   // than the driving one, so workers may call it between their chunks.
   void poll();
+  // Any thread: one more item (a layer, say) finished or passed over.
+  void itemDone() { items_.fetch_add(1, std::memory_order_relaxed); }
+  // The driving thread, once it has no work of its own left: keeps polling
+  // until `items` items are done, so that a cancel or an interrupt is seen
+  // while other threads finish theirs. Returns at once on other threads.
+  void watchUntilDone(std::int64_t items);
   // The driving thread, after the workers: rethrows what stopped the work.
   void finish();
 
  private:
   std::atomic<std::int64_t> done_;
   std::atomic<bool> stop_{false};
+  std::atomic<std::int64_t> items_{0};
   std::thread::id driver_;
   std::atomic_flag errorLock_ = ATOMIC_FLAG_INIT;
   std::exception_ptr error_;

@@ -234,9 +234,12 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
 #pragma omp parallel num_threads(share.layers) if (share.layers > 1)
   {
     std::optional<LayerWorkspace> ws;
-#pragma omp for schedule(dynamic, 1)
+#pragma omp for schedule(dynamic, 1) nowait
     for (std::int64_t s = 0; s < layerCount; ++s) {
-      if (progress.stopped()) continue;
+      if (progress.stopped()) {
+        progress.itemDone();
+        continue;
+      }
       const std::int64_t lb = lOff + s;
       const bool inside = lb >= 0 && lb < values.nl && lb < bathymetry.nl &&
                           values.layerSize() == bathymetry.layerSize();
@@ -250,8 +253,10 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
         }
       }
       progress.add(layerUnits);
+      progress.itemDone();
       progress.poll();
     }
+    progress.watchUntilDone(layerCount);
   }
   progress.finish();
 

@@ -11,6 +11,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cstring>
 #include <stdexcept>
 #include <string>
@@ -101,6 +102,29 @@ TEST(WorkProgressTest, AnInterruptSeenByTheDrivingThreadStopsTheWorkers) {
       progress.finish();
     } catch (const RunError& error) {
       _exit(error.exitCode() == SIGINT && error.message() == "Control-C send" ? 0 : 5);
+    }
+    _exit(6);
+  });
+  EXPECT_EQ(outcome.exitCode, 0);
+}
+
+TEST(WorkProgressTest, TheDrivingThreadKeepsAskingWhileOthersFinishTheirWork) {
+  // A worker that works until told to stop: only the driving thread, waiting
+  // for it, can see the interrupt and stop it.
+  ChildOutcome outcome = runChild([] {
+    installSignalHandlers();
+    WorkProgress progress(10);
+    std::thread worker([&progress] {
+      while (!progress.stopped()) std::this_thread::sleep_for(std::chrono::milliseconds(1));
+      progress.itemDone();
+    });
+    raise(SIGINT);
+    progress.watchUntilDone(1);
+    worker.join();
+    try {
+      progress.finish();
+    } catch (const RunError& error) {
+      _exit(error.exitCode() == SIGINT ? 0 : 5);
     }
     _exit(6);
   });
