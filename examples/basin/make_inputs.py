@@ -5,14 +5,41 @@ casts.txt (CTD-like temperature casts). Deterministic: the same files on every r
 The basin is 20 km x 15 km of 250 m cells, in UTM zone 32 with its south-west cell centre at
 easting 640000, northing 6150000. Land (NODATA) lies along a curved eastern coast and on an
 island in the middle; the bed deepens towards a trough in the west, down to 48 m.
+
+The grid is turned: karnet-mkgrid --orientation 15 makes its y axis point 15 degrees east of
+true north, so the grid's axes stand at 15 degrees minus the meridian convergence at the origin
+against the UTM axes. The casts are laid out on grid nodes and written at those nodes' UTM
+positions, so that each falls on the node it was drawn for, in the water and above the bed.
 """
 import math
 import os
+
+from osgeo import osr
 
 HERE = os.path.dirname(os.path.abspath(__file__))
 NCOLS, NROWS, CELL = 80, 60, 250.0
 X0, Y0 = 640000.0, 6150000.0
 NODATA = -9999
+ORIENTATION = 15.0  # degrees clockwise from true north to the grid's y axis (mkgrid --orientation)
+
+
+def convergence(x, y):
+    """Meridian convergence (degrees, clockwise from true north to grid north) at a UTM-32 point."""
+    utm = osr.SpatialReference()
+    utm.ImportFromEPSG(32632)
+    utm.SetAxisMappingStrategy(osr.OAMS_TRADITIONAL_GIS_ORDER)
+    geo = utm.CloneGeogCS()
+    geo.SetAxisMappingStrategy(osr.OAMS_TRADITIONAL_GIS_ORDER)
+    lon, lat, _ = osr.CoordinateTransformation(utm, geo).TransformPoint(x, y)
+    xn, yn, _ = osr.CoordinateTransformation(geo, utm).TransformPoint(lon, lat + 1e-4)
+    return -math.degrees(math.atan2(xn - x, yn - y))
+
+
+def node_position(i, j, turn):
+    """UTM position of grid node (i, j): the grid offsets turned clockwise by `turn` degrees."""
+    a = math.radians(turn)
+    u, v = i * CELL, j * CELL
+    return X0 + u * math.cos(a) + v * math.sin(a), Y0 - u * math.sin(a) + v * math.cos(a)
 
 
 def depth(i, j):
@@ -56,6 +83,7 @@ def main():
 
     # Casts on a coarse, slightly irregular station pattern; each is sampled every metre
     # from 1 m below the surface to 1 m above the bed.
+    turn = ORIENTATION - convergence(X0, Y0)
     lines = []
     for sj in range(5):
         for si in range(7):
@@ -64,10 +92,11 @@ def main():
             d = depth(i, j) if i < NCOLS and j < NROWS else None
             if d is None or d > -4.0:
                 continue
-            x, y = X0 + i * CELL, Y0 + j * CELL
+            x, y = node_position(i, j, turn)
             z = -1.0
             while z > d + 1.0:
-                lines.append("%.1f %.1f %.1f %.3f" % (x, y, z, temperature(x - X0, y - Y0, z)))
+                # The temperature field is drawn in the grid's own frame.
+                lines.append("%.1f %.1f %.1f %.3f" % (x, y, z, temperature(i * CELL, j * CELL, z)))
                 z -= 1.0
     with open(os.path.join(HERE, "casts.txt"), "w") as f:
         f.write("\n".join(lines) + "\n")

@@ -29,6 +29,7 @@ constexpr char kHelp[] =
     "\n"
     "Options:\n"
     "  //apv      run under the progress display; q or SIGUSR1 cancels the run\n"
+    "  --quiet    no summary (result, grid, observations) on stderr at the end\n"
     "  -debug     accepted, without effect\n"
     "  --threads N\n"
     "             threads of the computation (default: KARNET_THREADS, else all\n"
@@ -53,6 +54,7 @@ constexpr char kHelp[] =
 // Kept for the host's callback, which takes no arguments.
 int argumentCount = 0;
 char** argumentVector = nullptr;
+const char* programPath = "karnet";
 
 // Picks the parameter file, opens the log beside it, sets the run up and runs it.
 [[noreturn]] void runMain(int count, char** arguments) {
@@ -76,7 +78,11 @@ char** argumentVector = nullptr;
   if (log != nullptr) std::setvbuf(log, nullptr, _IOLBF, 0);
   karnet::logSetStream(log != nullptr ? log : stderr);
 
-  karnet::runProgram(parameterFile, threads);
+  karnet::RunInvocation invocation;
+  invocation.commandLine = karnet::commandLineText(programPath, count, arguments);
+  invocation.quiet = karnet::hasQuietArgument(count, arguments);
+  invocation.threads = threads;
+  karnet::runProgram(parameterFile, invocation);
 }
 
 int hostEntry() { runMain(argumentCount, argumentVector); }
@@ -102,6 +108,7 @@ int main(int argc, char** argv) {
   // The platform hands the arguments already split; the program's own name is
   // not one of them.
   argumentCount = argc > 0 ? argc - 1 : 0;
+  if (argc > 0 && argv[0] != nullptr) programPath = argv[0];
   argumentVector = argc > 0 ? argv + 1 : argv;
 
   const bool hostMode = karnet::hasHostModeArgument(argumentCount, argumentVector);

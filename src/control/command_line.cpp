@@ -6,6 +6,7 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
+#include <string>
 
 namespace karnet {
 namespace {
@@ -17,6 +18,8 @@ constexpr long kMaxThreads = 4096;
 
 bool isHostModeSwitch(const char* argument) { return strcasecmp(argument, "//apv") == 0; }
 
+bool isQuietSwitch(const char* argument) { return strcasecmp(argument, "--quiet") == 0; }
+
 bool isThreadsSwitch(const char* argument) { return strcasecmp(argument, kThreadsSwitch) == 0; }
 
 // "--threads=N".
@@ -26,8 +29,8 @@ bool isThreadsAssignment(const char* argument) {
 }
 
 bool isSkipped(const char* argument) {
-  return argument[0] == '\0' || isHostModeSwitch(argument) || strcasecmp(argument, "-debug") == 0 ||
-         isThreadsAssignment(argument);
+  return argument[0] == '\0' || isHostModeSwitch(argument) || isQuietSwitch(argument) ||
+         strcasecmp(argument, "-debug") == 0 || isThreadsAssignment(argument);
 }
 
 // A whole number 1..kMaxThreads, nothing else.
@@ -67,6 +70,36 @@ bool hasHostModeArgument(int count, const char* const* arguments) {
     if (isHostModeSwitch(arguments[i])) return true;
   }
   return false;
+}
+
+bool hasQuietArgument(int count, const char* const* arguments) {
+  for (int i = 0; i < count; ++i) {
+    if (isQuietSwitch(arguments[i])) return true;
+  }
+  return false;
+}
+
+std::string commandLineText(const char* program, int count, const char* const* arguments) {
+  std::string text = program != nullptr ? program : "karnet";
+  for (int i = 0; i < count; ++i) {
+    const std::string argument = arguments[i];
+    text += ' ';
+    if (!argument.empty() && argument.find_first_of(" \t\n'\"\\$`") == std::string::npos) {
+      text += argument;
+      continue;
+    }
+    // Single quotes keep everything but a single quote, which ends and restarts them.
+    text += '\'';
+    for (char c : argument) {
+      if (c == '\'') {
+        text += "'\\''";
+      } else {
+        text += c;
+      }
+    }
+    text += '\'';
+  }
+  return text;
 }
 
 int selectParameterFile(int count, const char* const* arguments, char* name) {

@@ -2,6 +2,7 @@
 #define KARNET_CONTROL_COMMAND_LINE_H_
 
 #include <cstddef>
+#include <string>
 
 namespace karnet {
 
@@ -22,8 +23,15 @@ bool hasHostModeArgument(int count, const char* const* arguments);
 int selectThreadCount(int count, const char* const* arguments, const char* environment,
                       int* threads);
 
-// Copies the last argument that is not "//apv", "-debug", a thread count
-// ("--threads N", "--threads=N") or empty (any case)
+// True when some argument equals "--quiet" (any case): no summary at the end.
+bool hasQuietArgument(int count, const char* const* arguments);
+
+// The program and its arguments as one line of shell words (arguments with
+// blanks or quotes single-quoted), for the record of how a result was made.
+std::string commandLineText(const char* program, int count, const char* const* arguments);
+
+// Copies the last argument that is not "//apv", "--quiet", "-debug", a thread
+// count ("--threads N", "--threads=N") or empty (any case)
 // into name (kFileNameSize characters, always terminated; empty when there is
 // none). Returns 1 when that name is also the last argument, as the usage
 // requires, else 0. A name that does not fit the buffer is not the last

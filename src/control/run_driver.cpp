@@ -1,5 +1,6 @@
 #include "control/run_driver.h"
 
+#include <cstdio>
 #include <cstdlib>
 #include <new>
 #include <stdexcept>
@@ -7,6 +8,7 @@
 #include "analysis/objective_analysis.h"
 #include "control/log.h"
 #include "control/progress.h"
+#include "control/run_summary.h"
 #include "control/signals.h"
 #include "control/termination.h"
 #include "input/bathymetry_read.h"
@@ -15,6 +17,7 @@
 #include "input/run_initialise.h"
 #include "interp/glo2loc.h"
 #include "interp/interp.h"
+#include "output/result_attributes.h"
 #include "output/result_write.h"
 #include "params/run_setup.h"
 #include "state/run_context.h"
@@ -28,7 +31,7 @@ struct DescriptionDeleter {
 };
 
 RunContext contextOf(Run& run) {
-  return RunContext{run.settings, runLog(), run.cartography.get(), run.threads};
+  return RunContext{run.settings, runLog(), run.cartography.get(), run.invocation.threads};
 }
 
 }  // namespace
@@ -64,14 +67,16 @@ void setupRun(const char* parameterFile, Run& run) {
   run.cartography->geoToProj(longitude, latitude, &run.settings.xOrigo, &run.settings.yOrigo);
 }
 
-int runPhases(Run& run) {
+int runPhases(Run& run, RunSummary* summary) {
   RunState& state = run.state;
   const RunContext context = contextOf(run);
   const RunSettings& settings = run.settings;
+  const RunParameters& parameters = run.parameters;
   std::int32_t lastObs = -1, jOff = 0, kOff = 0, lOff = 0;
 
   progressStatus("Scanning data ...");
-  dataScan(state, context, run.parameters.inputFiles.FileName, &lastObs, &jOff, &kOff, &lOff);
+  ObservationTally tally;
+  dataScan(state, context, parameters.inputFiles.FileName, &lastObs, &jOff, &kOff, &lOff, &tally);
   progressStatus("Scanning bathymetry ...");
   bathymetryScan(jOff, kOff, lOff, state, settings);
   progressStatus("Initialising ...");
@@ -81,9 +86,17 @@ int runPhases(Run& run) {
     interp(lastObs, jOff, kOff, lOff, state, context);
   }
   glo2loc(jOff, kOff, lOff, state, settings);
+  if (summary != nullptr) {
+    summary->resultPath = parameters.outputData.FileName;
+    summary->observations = tally;
+    countResultNodes(state.bathymetryGrid, state.landValue, settings, state.localValues, summary);
+  }
   progressStatus("Saving data ...");
-  return resultWrite(run.parameters.outputData.FileName, *state.resultDescription, 1,
-                     run.parameters.outputData.ItemType, state.localValues, settings.projection);
+  const TextAttributes attributes = resultGlobalAttributes(
+      parameters, run.invocation.commandLine, KARNET_VERSION, resultTimestamp());
+  return resultWrite(parameters.outputData.FileName, *state.resultDescription, 1,
+                     parameters.outputData.ItemType, state.localValues, settings.projection,
+                     &attributes);
 }
 
 void freeRunArrays(RunState& state) {
@@ -96,17 +109,20 @@ void freeRunArrays(RunState& state) {
 void runDriver(Run& run) {
   installSignalHandlers();
   runInitialise(run.state, contextOf(run));
+  RunSummary summary;
   // A run whose result could not be written has not produced what it was for.
-  if (runPhases(run) == 0) throw RunError::logged("\nERROR while writing result file\n");
+  if (runPhases(run, &summary) == 0) throw RunError::logged("\nERROR while writing result file\n");
   freeRunArrays(run.state);
   restoreSignalHandlers();
+  printRunSummary(stderr, summary, run.invocation.quiet);
 }
 
-void runProgram(const char* parameterFile, int threads) {
+void runProgram(const char* parameterFile, const RunInvocation& invocation) {
   try {
     // Lives until the process ends: exitRun leaves without unwinding.
     static Run run;
-    run.threads = threads > 0 ? threads : 1;
+    run.invocation = invocation;
+    if (run.invocation.threads < 1) run.invocation.threads = 1;
     setupRun(parameterFile, run);
     runDriver(run);
   } catch (const RunError& error) {

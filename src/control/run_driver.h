@@ -2,6 +2,7 @@
 #define KARNET_CONTROL_RUN_DRIVER_H_
 
 #include <memory>
+#include <string>
 
 #include "input/cartography.h"
 #include "params/run_parameters.h"
@@ -10,6 +11,15 @@
 
 namespace karnet {
 
+struct RunSummary;
+
+// How the program was started, as far as the run needs it.
+struct RunInvocation {
+  std::string commandLine;  // program and arguments, recorded in the result's history
+  bool quiet = false;       // no summary on stderr at the end of the run
+  int threads = 1;          // threads of the layer loops
+};
+
 // Everything one run holds from its setup to its end. The driver owns it; the
 // phases get the arrays by reference and the rest through a RunContext.
 struct Run {
@@ -17,7 +27,7 @@ struct Run {
   RunSettings settings;
   std::unique_ptr<Cartography> cartography;
   RunState state;
-  int threads = 1;
+  RunInvocation invocation;
 };
 
 // Reads the parameter file and the bathymetry header, derives and validates
@@ -26,20 +36,21 @@ struct Run {
 void setupRun(const char* parameterFile, Run& run);
 
 // Installs the signal handlers, initialises the run, runs the phases, frees
-// the run arrays and restores the handlers. Throws a RunError on failure.
+// the run arrays, restores the handlers and writes the summary to stderr.
+// Throws a RunError on failure.
 void runDriver(Run& run);
 
 // Scanning, bathymetry scan, interpolation, extraction and result file, in
-// order. Returns the result writer's result.
-int runPhases(Run& run);
+// order. Returns the result writer's result; fills summary when given.
+int runPhases(Run& run, RunSummary* summary = nullptr);
 
 void freeRunArrays(RunState& state);
 
-// The whole run of a parameter file with the given number of threads: setup
-// and driver, then the end of the process, "Successful" with exit code 0 or,
-// for an error thrown anywhere below, its log lines, message and exit code.
-// The one place where a run ends.
-[[noreturn]] void runProgram(const char* parameterFile, int threads);
+// The whole run of a parameter file as invoked: setup and driver, then the
+// end of the process, "Successful" with exit code 0 or, for an error thrown
+// anywhere below, its log lines, message and exit code. The one place where a
+// run ends.
+[[noreturn]] void runProgram(const char* parameterFile, const RunInvocation& invocation);
 
 }  // namespace karnet
 

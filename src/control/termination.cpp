@@ -87,6 +87,10 @@ void fatalError(const char* message, const std::int32_t* exitCode) {
 }
 
 void endRun(const RunError& error) {
+  if (!error.notice().empty()) {
+    std::fputs(error.notice().c_str(), stderr);
+    std::fflush(stderr);
+  }
   switch (error.kind()) {
     case RunError::Kind::kFatal: {
       const std::int32_t code = error.exitCode();

@@ -4,6 +4,7 @@
 
 #include <cctype>
 #include <cstdlib>
+#include <functional>
 #include <string>
 
 #include "gridfile/grid_file_internal.h"
@@ -46,9 +47,10 @@ std::string utmDefinition(const std::string& text) {
 
 }  // namespace
 
-std::string grdProjectionWkt(const std::string& projection) {
+bool grdWithProjectedCrs(const std::string& projection,
+                         const std::function<void(PJ_CONTEXT*, PJ*)>& use) {
   const std::string text = trimmed(projection);
-  if (text.empty() || upper(text) == "LOCAL") return std::string();
+  if (text.empty() || upper(text) == "LOCAL") return false;
   std::string definition = utmDefinition(text);
   if (definition.empty()) {
     definition = text;
@@ -58,18 +60,38 @@ std::string grdProjectionWkt(const std::string& projection) {
     }
   }
   PJ_CONTEXT* context = proj_context_create();
-  if (context == nullptr) return std::string();
+  if (context == nullptr) return false;
   proj_log_level(context, PJ_LOG_NONE);
-  std::string wkt;
+  bool used = false;
   PJ* crs = proj_create(context, definition.c_str());
   if (crs != nullptr) {
     if (proj_get_type(crs) == PJ_TYPE_PROJECTED_CRS) {
-      const char* text2 = proj_as_wkt(context, crs, PJ_WKT2_2019, nullptr);
-      if (text2 != nullptr) wkt = text2;
+      use(context, crs);
+      used = true;
     }
     proj_destroy(crs);
   }
   proj_context_destroy(context);
+  return used;
+}
+
+std::string grdProjectionWkt(const std::string& projection) {
+  std::string wkt;
+  grdWithProjectedCrs(projection, [&wkt](PJ_CONTEXT* context, PJ* crs) {
+    const char* text = proj_as_wkt(context, crs, PJ_WKT2_2019, nullptr);
+    if (text != nullptr) wkt = text;
+  });
+  return wkt;
+}
+
+std::string grdProjectionSpatialRef(const std::string& projection) {
+  std::string wkt;
+  grdWithProjectedCrs(projection, [&wkt](PJ_CONTEXT* context, PJ* crs) {
+    const char* const options[] = {"MULTILINE=NO", nullptr};
+    const char* text = proj_as_wkt(context, crs, PJ_WKT1_GDAL, options);
+    if (text == nullptr) text = proj_as_wkt(context, crs, PJ_WKT2_2019, options);
+    if (text != nullptr) wkt = text;
+  });
   return wkt;
 }
 

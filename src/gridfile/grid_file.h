@@ -5,7 +5,10 @@
 // failure and never throws. Items are numbered from 1.
 
 #include <cstdint>
+#include <functional>
 #include <string>
+#include <utility>
+#include <vector>
 
 namespace karnet {
 
@@ -61,6 +64,30 @@ int grdAddCustomBlock(GrdHeader* header, int type, const char* name, std::int32_
                       const float* values);
 int grdSetGeoInfoUTMProj(GrdHeader* header, const char* projection, double longitude,
                          double latitude, double orientation);
+// The georeferenced layout of a 3-D result file, set before grdFileCreate (a
+// header without it writes the plain layout: coordinates are distances from
+// the origin node, z counts upwards from the first level).
+struct GrdGeoreference {
+  // z holds depths below the surface: firstDepth at the first level, then
+  // falling by the z spacing.
+  double firstDepth = 0.0;
+  // The first node's x and y coordinate values.
+  double xFirst = 0.0;
+  double yFirst = 0.0;
+  // x and y are projection coordinates (with their CF standard names);
+  // otherwise distances along the grid's own axes.
+  bool projectedXY = false;
+  // The item names "crs" as its grid_mapping.
+  bool itemGridMapping = true;
+  // Longitude and latitude (degrees) of the nodes of row y (nx of each); when
+  // set, the file gets lon(y, x) and lat(y, x) and the item coordinates
+  // "lon lat". false from it fails the file's creation.
+  std::function<bool(std::int32_t y, double* lon, double* lat)> rowGeolocation;
+  // Global text attributes (title, history, ...), in order; empty texts are left out.
+  std::vector<std::pair<std::string, std::string>> globalAttributes;
+};
+int grdSetGeoreference(GrdHeader* header, const GrdGeoreference& georeference);
+
 // Creates the file once every item has its info and axis. Its contents are
 // assembled in memory: nothing appears under fileName before grdFileClose, and
 // an earlier file of that name stays as it is until then. Without

@@ -5,9 +5,11 @@
 // writing half of the layer. Nothing outside src/gridfile includes this.
 
 #include <netcdf.h>
+#include <proj.h>
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <string>
 #include <vector>
@@ -108,6 +110,8 @@ struct GrdHeader {
   double longitude = 0.0;
   double latitude = 0.0;
   double orientation = 0.0;
+  bool georeferenced = false;
+  GrdGeoreference georeference;
 };
 
 // Chains the blocks of a header in order (after a block was added).
@@ -116,9 +120,32 @@ void grdLinkBlocks(GrdHeader& header);
 // Discards a file being written: nothing of it reaches the disk.
 void grdDiscardWriteFile(GrdHeader& header);
 
+// Calls use with the projected CRS that a projection text names (UTM-<zone>,
+// EPSG:<code>, PROJ string, WKT); false, without calling it, when there is none
+// (LOCAL) or PROJ does not know it.
+bool grdWithProjectedCrs(const std::string& projection,
+                         const std::function<void(PJ_CONTEXT*, PJ*)>& use);
+
 // WKT of the projected CRS that a projection text names, empty when there is
 // none (LOCAL) or PROJ does not know it.
 std::string grdProjectionWkt(const std::string& projection);
+
+// One attribute of a CF grid mapping: a text or numbers.
+struct GrdCfAttribute {
+  std::string name;
+  std::string text;
+  std::vector<double> numbers;
+};
+
+// The CF grid_mapping_name and parameters of the CRS a projection text names
+// (transverse_mercator, lambert_conformal_conic, mercator, polar_stereographic,
+// albers_conical_equal_area, with the ellipsoid); empty when the CRS is none
+// of these or there is none (LOCAL).
+std::vector<GrdCfAttribute> grdCfGridMapping(const std::string& projection);
+
+// WKT of the projected CRS in the form GDAL writes as spatial_ref (WKT 1),
+// WKT 2 where WKT 1 cannot express it; empty as grdProjectionWkt.
+std::string grdProjectionSpatialRef(const std::string& projection);
 
 // Puts size bytes under finalName so that the name either keeps its earlier
 // file or holds the complete new one. false (and errno-style text in error)

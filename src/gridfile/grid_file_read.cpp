@@ -9,6 +9,7 @@
 #include <cstring>
 #include <memory>
 #include <set>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -142,10 +143,17 @@ bool readStructure(int ncid, GrdHeader& header) {
   if (nc_inq_nvars(ncid, &nvars) != NC_NOERR || nc_inq_natts(ncid, &natts) != NC_NOERR) {
     return false;
   }
+  // Grid mappings and auxiliary coordinates (lon, lat of a result) are no items.
   std::set<std::string> mappings = {"crs"};
   for (int v = 0; v < nvars; ++v) {
     const std::string mapping = gridMappingName(ncid, v);
     if (!mapping.empty()) mappings.insert(mapping);
+    std::string coordinates;
+    if (textAttribute(ncid, v, "coordinates", &coordinates)) {
+      std::istringstream words(coordinates);
+      std::string word;
+      while (words >> word) mappings.insert(word);
+    }
   }
   for (int v = 0; v < nvars; ++v) {
     const std::string name = variableName(ncid, v);

@@ -120,10 +120,40 @@ struct Layout {
   int dims[3] = {-1, -1, -1};  // x, y, z
   int coordVars[3] = {-1, -1, -1};
   int timeVar = -1;
+  int lonVar = -1;
+  int latVar = -1;
   std::vector<int> itemVars;
 };
 
-void defineAxis(NcStatus& status, int ncid, Layout& layout, int d, const GrdItem& item) {
+const GrdGeoreference* georeferenceOf(const GrdHeader& header) {
+  return header.georeferenced ? &header.georeference : nullptr;
+}
+
+// The coordinate attributes of the georeferenced layout: depths below the
+// surface on z; projection coordinates, or distances along a turned grid's
+// axes, on x and y.
+void describeGeoreferencedAxis(NcStatus& status, int ncid, int v, int d,
+                               const GrdGeoreference& g) {
+  if (d == 2) {
+    putText(status, ncid, v, "standard_name", "depth");
+    putText(status, ncid, v, "long_name", "depth below the sea surface");
+    putText(status, ncid, v, "positive", "down");
+    return;
+  }
+  if (g.projectedXY) {
+    putText(status, ncid, v, "standard_name",
+            d == 0 ? "projection_x_coordinate" : "projection_y_coordinate");
+    putText(status, ncid, v, "long_name",
+            d == 0 ? "x coordinate of projection" : "y coordinate of projection");
+    return;
+  }
+  putText(status, ncid, v, "long_name",
+          d == 0 ? "distance from the origin node along the grid's x axis"
+                 : "distance from the origin node along the grid's y axis");
+}
+
+void defineAxis(NcStatus& status, int ncid, Layout& layout, int d, const GrdItem& item,
+                const GrdGeoreference* georeference) {
   static const char* const kNames[3] = {"x", "y", "z"};
   static const char* const kAxes[3] = {"X", "Y", "Z"};
   static const char* const kLongNames[3] = {
@@ -138,6 +168,10 @@ void defineAxis(NcStatus& status, int ncid, Layout& layout, int d, const GrdItem
   putText(status, ncid, v, "units", "m");
   putText(status, ncid, v, "axis", kAxes[d]);
   putDouble(status, ncid, v, "spacing", static_cast<double>(item.spacings[d]));
+  if (georeference != nullptr) {
+    describeGeoreferencedAxis(status, ncid, v, d, *georeference);
+    return;
+  }
   putText(status, ncid, v, "long_name", kLongNames[d]);
   if (d == 2) putText(status, ncid, v, "positive", "up");
 }
@@ -173,7 +207,62 @@ void defineItem(NcStatus& status, int ncid, const GrdHeader& header, Layout& lay
   if (!standardName.empty()) putText(status, ncid, varid, "standard_name", standardName);
   const int type = item.itemType;
   status(nc_put_att_int(ncid, varid, "item_type", NC_INT, 1, &type));
-  if (header.geoSet) putText(status, ncid, varid, "grid_mapping", "crs");
+  const GrdGeoreference* g = georeferenceOf(header);
+  if (header.geoSet && (g == nullptr || g->itemGridMapping)) {
+    putText(status, ncid, varid, "grid_mapping", "crs");
+  }
+  if (g != nullptr && g->rowGeolocation) putText(status, ncid, varid, "coordinates", "lon lat");
+}
+
+// lon(y, x) and lat(y, x), chunked and compressed by rows.
+void defineGeolocation(NcStatus& status, int ncid, Layout& layout, const GrdItem& item) {
+  const int dims[2] = {layout.dims[1], layout.dims[0]};
+  const std::size_t nx = static_cast<std::size_t>(item.counts[0]);
+  const std::size_t ny = static_cast<std::size_t>(item.counts[1]);
+  const std::size_t chunks[2] = {std::max<std::size_t>(1, std::min(ny, kChunkValues / 2 / nx)),
+                                 std::min(nx, kChunkValues / 2)};
+  struct Variable {
+    const char* name;
+    const char* standardName;
+    const char* longName;
+    const char* units;
+    int* varid;
+  };
+  const Variable variables[2] = {
+      {"lon", "longitude", "longitude of the node", "degrees_east", &layout.lonVar},
+      {"lat", "latitude", "latitude of the node", "degrees_north", &layout.latVar}};
+  for (const Variable& v : variables) {
+    status(nc_def_var(ncid, v.name, NC_DOUBLE, 2, dims, v.varid));
+    if (!status.ok()) return;
+    status(nc_def_var_chunking(ncid, *v.varid, NC_CHUNKED, chunks));
+    status(nc_def_var_deflate(ncid, *v.varid, 1, 1, 1));
+    putText(status, ncid, *v.varid, "standard_name", v.standardName);
+    putText(status, ncid, *v.varid, "long_name", v.longName);
+    putText(status, ncid, *v.varid, "units", v.units);
+  }
+}
+
+// Fills lon and lat row by row, so that only one row of each is held.
+void writeGeolocation(NcStatus& status, int ncid, const Layout& layout, const GrdItem& item,
+                      const GrdGeoreference& g) {
+  const std::size_t nx = static_cast<std::size_t>(item.counts[0]);
+  std::vector<double> lon(nx), lat(nx);
+  for (std::int32_t row = 0; row < item.counts[1] && status.ok(); ++row) {
+    bool made = false;
+    try {
+      made = g.rowGeolocation(row, lon.data(), lat.data());
+    } catch (...) {
+      made = false;
+    }
+    if (!made) {
+      status(NC_EINVAL);
+      return;
+    }
+    const std::size_t start[2] = {static_cast<std::size_t>(row), 0};
+    const std::size_t count[2] = {1, nx};
+    status(nc_put_vara_double(ncid, layout.lonVar, start, count, lon.data()));
+    status(nc_put_vara_double(ncid, layout.latVar, start, count, lat.data()));
+  }
 }
 
 void defineCrs(NcStatus& status, int ncid, const GrdHeader& header) {
@@ -186,12 +275,27 @@ void defineCrs(NcStatus& status, int ncid, const GrdHeader& header) {
   putDouble(status, ncid, varid, "orientation", header.orientation);
   const std::string wkt = grdProjectionWkt(header.projection);
   if (!wkt.empty()) putText(status, ncid, varid, "crs_wkt", wkt);
+  if (!header.georeferenced) return;
+  const std::string spatialRef = grdProjectionSpatialRef(header.projection);
+  if (!spatialRef.empty()) putText(status, ncid, varid, "spatial_ref", spatialRef);
+  for (const GrdCfAttribute& a : grdCfGridMapping(header.projection)) {
+    if (a.numbers.empty()) {
+      putText(status, ncid, varid, a.name.c_str(), a.text);
+    } else {
+      status(nc_put_att_double(ncid, varid, a.name.c_str(), NC_DOUBLE, a.numbers.size(),
+                               a.numbers.data()));
+    }
+  }
 }
 
 // Names of the item variables: distinct from each other and from the
 // file's own variables.
 std::vector<std::string> itemNames(const GrdHeader& header) {
   std::set<std::string> taken = {"x", "y", "z", "time", "crs"};
+  if (header.georeferenced && header.georeference.rowGeolocation) {
+    taken.insert("lon");
+    taken.insert("lat");
+  }
   std::vector<std::string> names;
   for (std::size_t i = 0; i < header.items.size(); ++i) {
     std::string name = itemVariableName(*header.items[i]);
@@ -206,9 +310,10 @@ std::vector<std::string> itemNames(const GrdHeader& header) {
 bool defineFile(int ncid, const GrdHeader& header, Layout& layout) {
   NcStatus status;
   const GrdItem& first = *header.items[0];
+  const GrdGeoreference* g = georeferenceOf(header);
   if (header.timeAxis) status(nc_def_dim(ncid, "time", NC_UNLIMITED, &layout.dimTime));
   for (int d = first.axisDims - 1; d >= 0 && status.ok(); --d) {
-    defineAxis(status, ncid, layout, d, first);
+    defineAxis(status, ncid, layout, d, first, g);
   }
   if (header.timeAxis && status.ok()) {
     status(nc_def_var(ncid, "time", NC_DOUBLE, 1, &layout.dimTime, &layout.timeVar));
@@ -221,9 +326,22 @@ bool defineFile(int ncid, const GrdHeader& header, Layout& layout) {
   for (std::size_t i = 0; i < header.items.size() && status.ok(); ++i) {
     defineItem(status, ncid, header, layout, *header.items[i], names[i]);
   }
+  if (g != nullptr && g->rowGeolocation && status.ok()) {
+    defineGeolocation(status, ncid, layout, first);
+  }
   if (header.geoSet && status.ok()) defineCrs(status, ncid, header);
   putText(status, ncid, NC_GLOBAL, "Conventions", "CF-1.8");
-  if (!header.title.empty()) putText(status, ncid, NC_GLOBAL, "title", header.title);
+  bool titled = false;
+  if (g != nullptr) {
+    for (const auto& [name, text] : g->globalAttributes) {
+      if (text.empty()) continue;
+      putText(status, ncid, NC_GLOBAL, name.c_str(), text);
+      titled = titled || name == "title";
+    }
+  }
+  if (!header.title.empty() && !titled) {
+    putText(status, ncid, NC_GLOBAL, "title", header.title);
+  }
   for (const auto& block : header.blocks) {
     status(nc_put_att_float(ncid, NC_GLOBAL, block->name.c_str(), NC_FLOAT,
                             block->values.size(), block->values.data()));
@@ -231,11 +349,24 @@ bool defineFile(int ncid, const GrdHeader& header, Layout& layout) {
   status(nc_enddef(ncid));
   for (int d = 0; d < first.axisDims && status.ok(); ++d) {
     std::vector<double> values(static_cast<std::size_t>(first.counts[d]));
+    double start = static_cast<double>(first.origins[d]);
+    double step = static_cast<double>(first.spacings[d]);
+    if (g != nullptr) {
+      // Depths fall from the first (deepest) level upwards.
+      if (d == 2) {
+        start = g->firstDepth;
+        step = -step;
+      } else {
+        start = d == 0 ? g->xFirst : g->yFirst;
+      }
+    }
     for (std::size_t i = 0; i < values.size(); ++i) {
-      values[i] = static_cast<double>(first.origins[d]) +
-                  static_cast<double>(i) * static_cast<double>(first.spacings[d]);
+      values[i] = start + static_cast<double>(i) * step;
     }
     status(nc_put_var_double(ncid, layout.coordVars[d], values.data()));
+  }
+  if (g != nullptr && g->rowGeolocation && status.ok()) {
+    writeGeolocation(status, ncid, layout, first, *g);
   }
   return status.ok();
 }
@@ -326,6 +457,9 @@ int grdAddCustomBlock(GrdHeader* header, int type, const char* name, std::int32_
   for (const auto& block : header->blocks) {
     if (block->name == name) return 1;
   }
+  for (const auto& attribute : header->georeference.globalAttributes) {
+    if (attribute.first == name) return 1;
+  }
   auto block = std::make_unique<GrdCustomBlock>();
   block->name = name;
   block->values.assign(values, values + count);
@@ -345,6 +479,27 @@ int grdSetGeoInfoUTMProj(GrdHeader* header, const char* projection, double longi
   header->latitude = latitude;
   header->orientation = orientation;
   header->geoSet = true;
+  return 0;
+}
+
+int grdSetGeoreference(GrdHeader* header, const GrdGeoreference& georeference) {
+  if (!writable(header)) return 1;
+  if (!std::isfinite(georeference.firstDepth) || !std::isfinite(georeference.xFirst) ||
+      !std::isfinite(georeference.yFirst)) {
+    return 1;
+  }
+  std::set<std::string> names;
+  for (const auto& [name, text] : georeference.globalAttributes) {
+    // Float attributes are custom blocks; these are texts and must not clash
+    // with the file's own attributes or with each other.
+    if (!validBlockName(name.c_str()) && name != "title") return 1;
+    if (name == "Conventions" || !names.insert(name).second) return 1;
+    for (const auto& block : header->blocks) {
+      if (block->name == name) return 1;
+    }
+  }
+  header->georeference = georeference;
+  header->georeferenced = true;
   return 0;
 }
 

@@ -200,6 +200,18 @@ void Cartography::projToGeo(double x, double y, double* longitude, double* latit
   *latitude = finiteOrNaN(out.xy.y);
 }
 
+void Cartography::projToGeo(std::size_t count, double* x, double* y) const {
+  if (impl_->local || count == 0) return;
+  const std::size_t stride = sizeof(double);
+  proj_trans_generic(impl_->transform, PJ_INV, x, stride, count, y, stride, count, nullptr, 0,
+                     0, nullptr, 0, 0);
+  proj_errno_reset(impl_->transform);
+  for (std::size_t i = 0; i < count; ++i) {
+    x[i] = finiteOrNaN(x[i]);
+    y[i] = finiteOrNaN(y[i]);
+  }
+}
+
 double Cartography::convergence(double longitude, double latitude) const {
   if (impl_->local) return 0.0;
   // proj_factors wants radians, longitude from the base CRS's prime meridian,

@@ -1,6 +1,7 @@
 #ifndef KARNET_INPUT_CARTOGRAPHY_H_
 #define KARNET_INPUT_CARTOGRAPHY_H_
 
+#include <cstddef>
 #include <memory>
 #include <string>
 
@@ -19,6 +20,9 @@ class Cartography {
 
   void geoToProj(double longitude, double latitude, double* x, double* y) const;
   void projToGeo(double x, double y, double* longitude, double* latitude) const;
+  // projToGeo of count points in place: x becomes the longitude, y the
+  // latitude (NaN where PROJ cannot transform a point). One PROJ call for all.
+  void projToGeo(std::size_t count, double* x, double* y) const;
   // Meridian convergence in degrees (clockwise from true north to grid north).
   double convergence(double longitude, double latitude) const;
   // WKT of the projected CRS, empty when there is none (LOCAL).

@@ -1,5 +1,6 @@
 #include "input/data_scan.h"
 
+#include <cctype>
 #include <cerrno>
 #include <cmath>
 #include <cstdio>
@@ -99,13 +100,19 @@ bool readLine(std::FILE* file, std::string& text) {
   return any;
 }
 
-[[noreturn]] void waterFileError(RunState& state, std::int64_t lineNumber) {
-  stopScan(state, "\nERROR while reading water file\n      line number: " +
-                      std::to_string(lineNumber) + "\n");
+// The log keeps its fixed lines; the user also sees the file, the line and why.
+[[noreturn]] void waterFileError(RunState& state, const char* fileName, std::int64_t lineNumber,
+                                 const std::string& reason) {
+  releaseAll(state);
+  throw RunError::logged("\nERROR while reading water file\n      line number: " +
+                         std::to_string(lineNumber) + "\n")
+      .withNotice("karnet: " + std::string(fileName) + ":" + std::to_string(lineNumber) + ": " +
+                  reason + "\n");
 }
 
 // Reads every observation line, turned into the grid frame. Returns the count.
-std::int64_t readObservations(RunState& state, const Rotation& r, Extent ext[3]) {
+std::int64_t readObservations(RunState& state, const char* fileName, const Rotation& r,
+                              Extent ext[3]) {
   ScatterData& sd = state.scatter;
   std::FILE* file = state.observationFile;
   std::rewind(file);
@@ -116,10 +123,15 @@ std::int64_t readObservations(RunState& state, const Rotation& r, Extent ext[3])
     ++lineNumber;
     if (stored % 1000 == 0) progressCheckCancel();
     double v[4];
-    if (!parseObservation(line.c_str(), v)) waterFileError(state, lineNumber);
+    if (!parseObservation(line.c_str(), v)) {
+      const std::string problem = observationLineProblem(line.c_str());
+      waterFileError(state, fileName, lineNumber, problem.empty() ? "cannot be read" : problem);
+    }
     // The arrays were sized from the line count; a file that grew since then
     // must not write past them.
-    if (stored >= sd.capacity) waterFileError(state, lineNumber);
+    if (stored >= sd.capacity) {
+      waterFileError(state, fileName, lineNumber, "the file grew while it was read");
+    }
     const double x = v[0], y = v[1];
     sd.x[stored] = y * r.si + x * r.co;
     sd.y[stored] = y * r.co - x * r.si;
@@ -135,7 +147,48 @@ std::int64_t readObservations(RunState& state, const Rotation& r, Extent ext[3])
   return stored;
 }
 
+// Counts where an observation lies: its column (the basic node it bins to,
+// as the gridding does) in the local grid's footprint, that column's bed.
+void tallyObservation(const FloatGrid2D& bed, double landValue, std::int32_t jOff,
+                      std::int32_t kOff, double xBasic, double yBasic, double z,
+                      ObservationTally& tally) {
+  const std::int64_t i = static_cast<std::int64_t>(xBasic + 0.5) - jOff;
+  const std::int64_t j = static_cast<std::int64_t>(yBasic + 0.5) - kOff;
+  if (i < 0 || j < 0 || i >= bed.nj || j >= bed.nk) {
+    ++tally.outside;
+    return;
+  }
+  const float b = bed.data[j * bed.nj + i];
+  if (!(landValue > static_cast<double>(b))) {
+    ++tally.onLand;
+  } else if (z < static_cast<double>(b)) {
+    ++tally.belowBed;
+  } else {
+    ++tally.inside;
+  }
+}
+
 }  // namespace
+
+std::string observationLineProblem(const char* line) {
+  const char* p = line;
+  for (int n = 0; n < 4; ++n) {
+    while (*p == ' ' || *p == '\t' || *p == '\r' || *p == '\v' || *p == '\f') ++p;
+    if (*p == '\0') {
+      if (n == 0) return "empty line";
+      return "4 numbers expected (x y z value), found " + std::to_string(n);
+    }
+    const char* wordEnd = p;
+    while (*wordEnd != '\0' && std::isspace(static_cast<unsigned char>(*wordEnd)) == 0) ++wordEnd;
+    std::string word(p, std::min<std::size_t>(static_cast<std::size_t>(wordEnd - p), 40));
+    char* end = nullptr;
+    const double v = std::strtod(p, &end);
+    if (end == p) return "not a number: \"" + word + "\"";
+    if (!std::isfinite(v)) return "not a finite number: \"" + word + "\"";
+    p = end;
+  }
+  return std::string();
+}
 
 BasicAxis layBasicAxis(double dataMin, double dataMax, double localFirst, float spacing,
                        std::int32_t firstIndex, std::int32_t lastIndex) {
@@ -171,7 +224,7 @@ BasicAxis layBasicAxis(double dataMin, double dataMax, double localFirst, float 
 
 void dataScan(RunState& state, const RunContext& context, const char* bathymetryFile,
               std::int32_t* lastObs, std::int32_t* jOff, std::int32_t* kOff,
-              std::int32_t* lOff) {
+              std::int32_t* lOff, ObservationTally* tally) {
   const RunSettings& s = context.settings;
   Report& report = context.report;
   if (context.cartography == nullptr) stopScan(state, "\nUnable to initialize geo. system\n");
@@ -202,7 +255,7 @@ void dataScan(RunState& state, const RunContext& context, const char* bathymetry
 
   progressStatus("Reading data file ...");
   Extent obs[3] = {{1e9, -1e9}, {1e9, -1e9}, {1e9, -1e9}};
-  const std::int64_t count = readObservations(state, r, obs);
+  const std::int64_t count = readObservations(state, s.dataFileName, r, obs);
 
   const double xMin = std::min(obs[0].min, bx.min), xMax = std::max(obs[0].max, bx.max);
   const double yMin = std::min(obs[1].min, by.min), yMax = std::max(obs[1].max, by.max);
@@ -240,11 +293,19 @@ void dataScan(RunState& state, const RunContext& context, const char* bathymetry
 
   ScatterData& sd = state.scatter;
   const double dx = s.dx, dy = s.dy, dz = s.dz;
+  ObservationTally counted;
+  counted.read = count;
   for (std::int64_t n = 0; n < count; ++n) {
+    const double z = sd.z[n];
     sd.x[n] = (sd.x[n] - ax.origin) / dx;
     sd.y[n] = (sd.y[n] - ay.origin) / dy;
-    sd.z[n] = (sd.z[n] - az.origin) / dz;
+    sd.z[n] = (z - az.origin) / dz;
+    if (tally != nullptr) {
+      tallyObservation(state.bathymetryGrid, state.landValue, *jOff, *kOff, sd.x[n], sd.y[n], z,
+                       counted);
+    }
   }
+  if (tally != nullptr) *tally = counted;
 
   const auto nj = static_cast<std::int32_t>(ax.count);
   const auto nk = static_cast<std::int32_t>(ay.count);

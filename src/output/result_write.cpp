@@ -4,6 +4,7 @@
 
 #include "gridfile/grid_file.h"
 #include "gridfile/units.h"
+#include "output/result_coordinates.h"
 #include "support/file_description.h"
 #include "support/float_grid.h"
 
@@ -12,7 +13,7 @@ namespace {
 
 // Every header call up to the file's creation; the first failure stops them.
 int describeResult(GrdHeader* header, const FileDescription& d, std::int32_t itemType,
-                   const char* projection) {
+                   const char* projection, const TextAttributes* attributes) {
   if (grdSetDeleteValFloat(header, kDeleteValueFloat) != 0) return 1;
   if (grdSetDeleteValDouble(header, kDeleteValueDouble) != 0) return 1;
   if (grdSetDataType(header, 0) != 0) return 1;
@@ -37,13 +38,17 @@ int describeResult(GrdHeader* header, const FileDescription& d, std::int32_t ite
       0) {
     return 1;
   }
-  return 0;
+  GrdGeoreference georeference;
+  if (!resultGeoreference(d, projection != nullptr ? projection : "", &georeference)) return 1;
+  if (attributes != nullptr) georeference.globalAttributes = *attributes;
+  return grdSetGeoreference(header, georeference);
 }
 
 }  // namespace
 
 int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
-                std::int32_t itemType, const FloatGrid3D& values, const char* projection) {
+                std::int32_t itemType, const FloatGrid3D& values, const char* projection,
+                const TextAttributes* globalAttributes) {
   grdInitSystem();
   GrdHeader* header = nullptr;
   if (grdHeaderCreate(1, fileName, "", 1, 1, 2, &header) != 0) {
@@ -51,7 +56,7 @@ int resultWrite(const char* fileName, const FileDescription& description, int wr
     return 0;
   }
   GrdFile* file = nullptr;
-  if (describeResult(header, description, itemType, projection) != 0 ||
+  if (describeResult(header, description, itemType, projection, globalAttributes) != 0 ||
       grdFileCreate(fileName, header, &file) != 0) {
     grdHeaderDestroy(&header);
     return 0;

@@ -3,6 +3,8 @@
 
 #include <cstdint>
 
+#include "output/result_attributes.h"
+
 namespace karnet {
 
 struct FileDescription;
@@ -10,11 +12,16 @@ struct FloatGrid3D;
 
 // Writes the local result grid as a 3-D gridded file with one item of the given
 // type, the description's axes, custom block and geographic information, and
-// (with writeValues) one time step of values. 1 when the file was written and
+// (with writeValues) one time step of values. The file is georeferenced: z
+// holds depths below the surface; x and y projection coordinates (a grid
+// parallel to the projection's axes) or distances along the grid's axes (a
+// turned grid); lon and lat every node's position (not for LOCAL); crs the CF
+// grid mapping. globalAttributes (title, history, ...) are added when given. 1 when the file was written and
 // closed, 0 on any failure; a failed write leaves no file under fileName and
 // keeps an earlier file of that name.
 int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
-                std::int32_t itemType, const FloatGrid3D& values, const char* projection);
+                std::int32_t itemType, const FloatGrid3D& values, const char* projection,
+                const TextAttributes* globalAttributes = nullptr);
 
 }  // namespace karnet
 

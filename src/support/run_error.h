@@ -36,7 +36,15 @@ class RunError : public std::exception {
   }
   static RunError cancelled() { return RunError(Kind::kCancelled, "Cancel computation", 0); }
 
+  // The same error with a line for the standard error stream, written before
+  // anything else (a message that the log's fixed lines leave out).
+  RunError withNotice(std::string notice) && {
+    notice_ = std::move(notice);
+    return std::move(*this);
+  }
+
   Kind kind() const { return kind_; }
+  const std::string& notice() const { return notice_; }
   const std::string& message() const { return message_; }
   std::int32_t exitCode() const { return exitCode_; }
   const char* what() const noexcept override { return message_.c_str(); }
@@ -48,6 +56,7 @@ class RunError : public std::exception {
   Kind kind_;
   std::string message_;
   std::int32_t exitCode_;
+  std::string notice_;
 };
 
 }  // namespace karnet

@@ -16,21 +16,26 @@ TEST(CommandLineTest, ModeAndParameterFileFollowTheArguments) {
   struct Case {
     std::vector<std::string> arguments;
     bool host;
+    bool quiet;
     int valid;
     std::string name;  // the last argument that is no switch, cut to fit the buffer
   };
   const Case cases[] = {
-      {{"case.pfs"}, false, 1, "case.pfs"},
-      {{"-DEBUG", "//Apv", "runs/case.pfs"}, true, 1, "runs/case.pfs"},
-      {{"//apvx", "/apv", "case.pfs"}, false, 1, "case.pfs"},
-      {{"case.pfs", "//APV"}, true, 0, "case.pfs"},
-      {{}, false, 0, ""},
-      {{fits}, false, 1, fits},
-      {{fits + "p"}, false, 0, fits},
+      {{"case.pfs"}, false, false, 1, "case.pfs"},
+      {{"-DEBUG", "//Apv", "runs/case.pfs"}, true, false, 1, "runs/case.pfs"},
+      {{"//apvx", "/apv", "case.pfs"}, false, false, 1, "case.pfs"},
+      {{"case.pfs", "//APV"}, true, false, 0, "case.pfs"},
+      {{"--quiet", "//apv", "case.pfs"}, true, true, 1, "case.pfs"},
+      {{"//apv", "--QUIET", "case.pfs"}, true, true, 1, "case.pfs"},
+      {{"case.pfs", "--quiet"}, false, true, 0, "case.pfs"},
+      {{"-quiet", "case.pfs"}, false, false, 1, "case.pfs"},
+      {{}, false, false, 0, ""},
+      {{fits}, false, false, 1, fits},
+      {{fits + "p"}, false, false, 0, fits},
       // A thread count and its value are no parameter file.
-      {{"--threads", "4", "case.pfs"}, false, 1, "case.pfs"},
-      {{"--THREADS=4", "//apv", "case.pfs"}, true, 1, "case.pfs"},
-      {{"case.pfs", "--threads", "4"}, false, 0, "case.pfs"},
+      {{"--threads", "4", "case.pfs"}, false, false, 1, "case.pfs"},
+      {{"--THREADS=4", "--quiet", "//apv", "case.pfs"}, true, true, 1, "case.pfs"},
+      {{"case.pfs", "--threads", "4"}, false, false, 0, "case.pfs"},
   };
   for (const Case& c : cases) {
     std::vector<const char*> arguments;
@@ -38,6 +43,7 @@ TEST(CommandLineTest, ModeAndParameterFileFollowTheArguments) {
     SCOPED_TRACE(arguments.empty() ? "(none)" : arguments.back());
     const int count = static_cast<int>(arguments.size());
     EXPECT_EQ(hasHostModeArgument(count, arguments.data()), c.host);
+    EXPECT_EQ(hasQuietArgument(count, arguments.data()), c.quiet);
     char name[kFileNameSize];
     std::memset(name, 'x', sizeof name);
     EXPECT_EQ(selectParameterFile(count, arguments.data(), name), c.valid);
@@ -121,6 +127,14 @@ TEST(CommandLineTest, LogFileLiesBesideTheParameterFileWhenItsNameFits) {
     EXPECT_EQ(makeLogFileName(c.parameterFile.c_str(), log), c.made) << c.parameterFile;
     EXPECT_EQ(std::string(log), c.log) << c.parameterFile;
   }
+}
+
+// The command line a result records can be pasted back into a shell.
+TEST(CommandLineTest, CommandLineTextQuotesWhatTheShellWouldSplit) {
+  const char* const arguments[] = {"--quiet", "my case.pfs", "it's", "", "a$b"};
+  EXPECT_EQ(commandLineText("/opt/karnet", 5, arguments),
+            "/opt/karnet --quiet 'my case.pfs' 'it'\\''s' '' 'a$b'");
+  EXPECT_EQ(commandLineText(nullptr, 0, arguments), "karnet");
 }
 
 }  // namespace

@@ -101,21 +101,28 @@ TEST(BilinearRun, ResultFileCarriesItsDescription) {
   ASSERT_EQ(runKarnet({"case.pfs"}, dir.path(), kQuiet).exitCode, 0);
   const ProcessResult header = runProgram("/usr/bin/ncdump", {"-h", "result.nc"}, dir.path());
   ASSERT_EQ(header.exitCode, 0) << header.err;
-  // The item is named and described after its type; coordinates are distances from the
-  // grid's first node; the custom block keeps the bathymetry's values.
+  // The item is named and described after its type; x and y are the nodes' plain metres,
+  // z their depth below the surface; the custom block keeps the bathymetry's values.
   for (const char* line :
        {"time = UNLIMITED ; // (1 currently)", "z = 10 ;", "y = 21 ;", "x = 21 ;",
         "float Salinity(time, z, y, x) ;", "Salinity:units = \"1e-3\" ;",
         "Salinity:standard_name = \"sea_water_salinity\" ;", "Salinity:item_type = 3 ;",
         "crs:projection = \"LOCAL\" ;", "crs:origin_longitude = 1000. ;",
-        "crs:origin_latitude = 2000. ;", "z:spacing = 2. ;",
+        "crs:origin_latitude = 2000. ;", "z:spacing = 2. ;", "z:positive = \"down\" ;",
+        "z:standard_name = \"depth\" ;", "Salinity:grid_mapping = \"crs\" ;",
+        ":title = \"karnet test case\" ;", ":source = \"karnet ",
         ":Q84_Misc = 0.f, -1.e-30f, -900.f, 10.f, -1.e-30f, -1.e-30f, -1.e-30f ;"}) {
     EXPECT_NE(header.out.find(line), std::string::npos) << line << "\n" << header.out;
   }
-  const ProcessResult levels = runProgram("/usr/bin/ncdump", {"-v", "z", "result.nc"}, dir.path());
-  EXPECT_NE(levels.out.find("z = 0, 2, 4, 6, 8, 10, 12, 14, 16, 18 ;"),
-            std::string::npos)
+  // Plain metres have no place on the earth: no lon and lat.
+  EXPECT_EQ(header.out.find("lon("), std::string::npos) << header.out;
+  EXPECT_EQ(header.out.find("coordinates"), std::string::npos) << header.out;
+  // Level l lies (lx + 1 - l) * dz below the surface: the first level 20 m, the last 2 m.
+  const ProcessResult levels =
+      runProgram("/usr/bin/ncdump", {"-v", "z,x", "result.nc"}, dir.path());
+  EXPECT_NE(levels.out.find("z = 20, 18, 16, 14, 12, 10, 8, 6, 4, 2 ;"), std::string::npos)
       << levels.out;
+  EXPECT_NE(levels.out.find("x = 1000, 1250, 1500, 1750,"), std::string::npos) << levels.out;
 }
 
 TEST(BilinearRun, FailedWriteIsAnErrorAndLeavesNoFile) {

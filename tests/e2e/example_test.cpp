@@ -34,10 +34,13 @@ TEST(Example, BasinRunsAndItsResultOpensInNcdumpAndXarray) {
   for (const char* line :
        {"float Temperature(time, z, y, x) ;", "Temperature:units = \"degree_Celsius\" ;",
         "Temperature:standard_name = \"sea_water_temperature\" ;",
-        "Temperature:grid_mapping = \"crs\" ;", "crs:projection = \"UTM-32\" ;",
+        "Temperature:coordinates = \"lon lat\" ;", "crs:projection = \"UTM-32\" ;",
+        "crs:grid_mapping_name = \"transverse_mercator\" ;",
         "crs:orientation = 15. ;", ":Conventions = \"CF-1.8\" ;", "x:units = \"m\" ;"}) {
     EXPECT_NE(header.out.find(line), std::string::npos) << line << "\n" << header.out;
   }
+  // The grid is turned 15 degrees against north: no tool may place it through x and y.
+  EXPECT_EQ(header.out.find("Temperature:grid_mapping"), std::string::npos) << header.out;
 
   // Both methods give a plausible temperature field: warm at the top, cold at the bottom,
   // dry nodes and nodes out of reach masked.

@@ -1,6 +1,10 @@
 // Laying the basic grid over the data and the local grid, one axis at a time.
 #include <gtest/gtest.h>
 
+#include <string>
+#include <utility>
+#include <vector>
+
 #include "input/data_scan.h"
 
 namespace karnet {
@@ -67,6 +71,26 @@ TEST(BasicAxis, HugeExtentsGiveCountsBeyondThirtyTwoBits) {
   // The caller refuses such a grid; the count itself must not wrap.
   const BasicAxis a = layBasicAxis(0.0, 1e12, 0.0, 1.0f, 0, 10);
   EXPECT_GT(a.count, std::int64_t{2147483647});
+}
+
+// What the user is told about an observation line that cannot be read.
+TEST(ObservationLine, ProblemsNamed) {
+  const std::vector<std::pair<const char*, std::string>> cases = {
+      {"1 2 -3 4.5", ""},
+      {"  1e3\t2 -3 4 trailing text", ""},
+      {"1 2 -3 4\r", ""},
+      {"", "empty line"},
+      {" \t\r", "empty line"},
+      {"lon lat z value", "not a number: \"lon\""},
+      {"1 2 depth 4", "not a number: \"depth\""},
+      {"1 2 -3", "4 numbers expected (x y z value), found 3"},
+      {"1 2 -3 nan", "not a finite number: \"nan\""},
+      {"1 inf -3 4", "not a finite number: \"inf\""},
+      {"1 2 -3 1e999", "not a finite number: \"1e999\""},
+  };
+  for (const auto& [line, problem] : cases) {
+    EXPECT_EQ(observationLineProblem(line), problem) << line;
+  }
 }
 
 }  // namespace

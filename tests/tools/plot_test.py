@@ -87,6 +87,67 @@ def write_bathymetry(path):
         crs.orientation = 0.0
 
 
+def load_plot_module():
+    """The karnet-plot script as a module, to check how it places observations."""
+    import importlib.machinery
+    import importlib.util
+
+    loader = importlib.machinery.SourceFileLoader("karnet_plot", PLOT)
+    spec = importlib.util.spec_from_loader("karnet_plot", loader)
+    module = importlib.util.module_from_spec(spec)
+    loader.exec_module(module)
+    return module
+
+
+class ObservationPlacementTest(unittest.TestCase):
+    """Observations drawn on a grid without lon/lat land on the node they were taken at."""
+
+    def grid_file(self, tmp, projection, lon0, lat0, orientation, wkt=None):
+        path = os.path.join(tmp, "grid.nc")
+        with netCDF4.Dataset(path, "w") as ds:
+            crs = ds.createVariable("crs", "i4")
+            crs.projection = projection
+            crs.origin_longitude = lon0
+            crs.origin_latitude = lat0
+            crs.orientation = orientation
+            if wkt:
+                crs.crs_wkt = wkt
+        return netCDF4.Dataset(path)
+
+    def test_turned_local_and_utm_grids(self):
+        plot = load_plot_module()
+        from osgeo import osr
+
+        with tempfile.TemporaryDirectory() as tmp:
+            # Plain metres, y axis pointing east: a point 1 km north of the origin lies 1 km
+            # along the grid's negative x axis, one 2 km east lies 2 km along its y axis.
+            with self.grid_file(tmp, "LOCAL", 1000.0, 2000.0, 90.0) as ds:
+                u, v = plot.grid_frame(ds, np.array([1000.0, 3000.0]), np.array([3000.0, 2000.0]))
+                np.testing.assert_allclose(u, [-1.0, 0.0], atol=1e-9)
+                np.testing.assert_allclose(v, [0.0, 2.0], atol=1e-9)
+        utm = osr.SpatialReference()
+        utm.ImportFromEPSG(32632)
+        utm.SetAxisMappingStrategy(osr.OAMS_TRADITIONAL_GIS_ORDER)
+        geo = utm.CloneGeogCS()
+        geo.SetAxisMappingStrategy(osr.OAMS_TRADITIONAL_GIS_ORDER)
+        to_utm = osr.CoordinateTransformation(geo, utm)
+        lon0, lat0 = 11.0, 55.0
+        x0, y0, _ = to_utm.TransformPoint(lon0, lat0)
+        # The convergence there, from the direction of true north in the UTM plane.
+        xn, yn, _ = to_utm.TransformPoint(lon0, lat0 + 1e-3)
+        gamma = -np.degrees(np.arctan2(xn - x0, yn - y0))
+        self.assertGreater(gamma, 1.0)  # east of the central meridian: grid north turned east
+        turn = np.radians(20.0 - gamma)
+        nodes = [(3.0, 4.0), (10.0, 0.0), (0.0, 7.5)]
+        xs = [x0 + 1000 * (i * np.cos(turn) + j * np.sin(turn)) for i, j in nodes]
+        ys = [y0 + 1000 * (-i * np.sin(turn) + j * np.cos(turn)) for i, j in nodes]
+        with tempfile.TemporaryDirectory() as tmp:
+            with self.grid_file(tmp, "UTM-32", lon0, lat0, 20.0, utm.ExportToWkt()) as ds:
+                u, v = plot.grid_frame(ds, np.array(xs), np.array(ys))
+        np.testing.assert_allclose(u, [n[0] for n in nodes], atol=2e-3)
+        np.testing.assert_allclose(v, [n[1] for n in nodes], atol=2e-3)
+
+
 class PlotTest(unittest.TestCase):
     def setUp(self):
         self.dir = tempfile.TemporaryDirectory()

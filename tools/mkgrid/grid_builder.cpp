@@ -1,12 +1,14 @@
-// From an ESRI ASCII grid to a bathymetry file of karnet's layout.
+// From a source raster to a bathymetry file of karnet's layout.
 #include "mkgrid/grid_builder.h"
 
 #include <cfloat>
 #include <cmath>
-#include <exception>
+#include <new>
 
 #include "gridfile/grid_file.h"
-#include "input/cartography.h"
+#include "mkgrid/resample.h"
+#include "mkgrid/source_raster.h"
+#include "mkgrid/target_grid.h"
 
 namespace karnet::mkgrid {
 namespace {
@@ -20,78 +22,66 @@ bool representable(double value) { return std::isfinite(value) && std::fabs(valu
 
 }  // namespace
 
-bool buildBathymetry(const EsriGrid& grid, const BuildOptions& options, Bathymetry* result,
-                     std::string* error) {
-  std::string ignored;
-  if (error == nullptr) error = &ignored;
-  if (grid.ncols < 1 || grid.nrows < 1 ||
-      grid.values.size() != static_cast<std::size_t>(grid.ncols) * grid.nrows) {
-    *error = "the grid holds no values";
-    return false;
-  }
-  if (!(grid.dx > 0.0) || !(grid.dy > 0.0) || !representable(grid.dx) ||
-      !representable(grid.dy)) {
-    *error = "cell sizes must be positive";
-    return false;
-  }
+bool makeBathymetry(const MkgridOptions& options, Bathymetry* result, std::string* summary,
+                    std::string* error) {
   if (!representable(options.landValue)) {
     *error = "the land value must be a finite 32-bit number";
     return false;
   }
+  SourceRaster source;
+  if (!openSourceRaster(options.input, options.variable, &source, error)) return false;
+  TargetGrid grid;
+  std::string notes;
+  if (!planGrid(source, options, &grid, &notes, error)) return false;
+  std::vector<double> raw;
+  if (!resampleSource(source, grid, &raw, error)) return false;
+
   Bathymetry out;
-  out.nx = grid.ncols;
-  out.ny = grid.nrows;
+  out.nx = grid.nx;
+  out.ny = grid.ny;
   out.dx = static_cast<float>(grid.dx);
   out.dy = static_cast<float>(grid.dy);
-  out.projection = options.projection;
+  out.projection = grid.projection;
+  out.longitude = grid.longitude;
+  out.latitude = grid.latitude;
+  out.orientation = grid.orientation;
   out.landValue = static_cast<float>(options.landValue);
   out.title = options.title;
-
   try {
-    Cartography map(options.projection, 0.0, 0.0, 0.0);
-    if (options.origin == OriginSource::Geographic) {
-      out.longitude = options.originA;
-      out.latitude = options.originB;
-    } else {
-      double x = options.originA;
-      double y = options.originB;
-      if (options.origin == OriginSource::Grid) {
-        // The origin node is the centre of the south-west cell.
-        x = grid.xll + (grid.xIsCorner ? grid.dx / 2.0 : 0.0);
-        y = grid.yll + (grid.yIsCorner ? grid.dy / 2.0 : 0.0);
-      }
-      map.projToGeo(x, y, &out.longitude, &out.latitude);
+    out.values.resize(raw.size());
+  } catch (const std::bad_alloc&) {
+    *error = "not enough memory for the bathymetry";
+    return false;
+  }
+  const bool scaled = source.scale != 1.0 || source.offset != 0.0;
+  std::size_t land = 0;
+  for (std::size_t k = 0; k < raw.size(); ++k) {
+    double v = raw[k];
+    if (std::isnan(v)) {
+      out.values[k] = out.landValue;
+      ++land;
+      continue;
     }
-    if (!std::isfinite(out.longitude) || !std::isfinite(out.latitude)) {
-      *error = "the origin lies outside the projection's domain";
+    if (scaled) v = v * source.scale + source.offset;
+    if (options.negate) v = -v;
+    if (!representable(v)) {
+      *error = options.input + ": value " + std::to_string(v) + " does not fit a 32-bit float";
       return false;
     }
-    out.orientation = options.hasOrientation ? options.orientation
-                                             : map.convergence(out.longitude, out.latitude);
-  } catch (const std::exception& e) {
-    *error = "unusable projection '" + options.projection + "': " + e.what();
+    out.values[k] = static_cast<float>(v);
+  }
+  if (land == raw.size()) {
+    *error = "no node of the grid gets a value from " + options.input +
+             ": the region does not overlap it, or all its cells there are NODATA";
     return false;
   }
-  if (!std::isfinite(out.orientation)) {
-    *error = "the orientation is not a finite number";
-    return false;
-  }
-
-  const std::size_t nx = static_cast<std::size_t>(grid.ncols);
-  const std::size_t ny = static_cast<std::size_t>(grid.nrows);
-  out.values.resize(nx * ny);
-  for (std::size_t row = 0; row < ny; ++row) {
-    const std::size_t j = ny - 1 - row;  // the file's first row is the northernmost
-    for (std::size_t i = 0; i < nx; ++i) {
-      const double v = grid.values[row * nx + i];
-      double stored = grid.isNodata(v) ? options.landValue : (options.negate ? -v : v);
-      if (!representable(stored)) {
-        *error = "value " + std::to_string(v) + " does not fit a 32-bit float";
-        return false;
-      }
-      out.values[j * nx + i] = static_cast<float>(stored);
-    }
-  }
+  const char* methods[] = {"", "bilinear", "average", "nearest", "cubic"};
+  *summary =
+      "  source: " + options.input + ", " + source.what + "\n" + notes + "  " +
+      (grid.copyCells ? std::string("nodes copied from the source's cells")
+                      : std::string("resampled (") + methods[static_cast<int>(grid.method)] + ")") +
+      "; " + std::to_string(land) + " of " + std::to_string(raw.size()) +
+      " nodes without a value set to the land value\n";
   *result = std::move(out);
   return true;
 }
@@ -111,15 +101,20 @@ bool writeBathymetry(const std::string& fileName, const Bathymetry& b, std::stri
     return false;
   }
   GrdItem* item = grdItemD(header, 1);
-  const float misc[7] = {static_cast<float>(b.orientation), kDelete, kMiscThird, b.landValue,
-                         kDelete, kDelete, kDelete};
+  const float misc[7] = {static_cast<float>(b.orientation),
+                         kDelete,
+                         kMiscThird,
+                         b.landValue,
+                         kDelete,
+                         kDelete,
+                         kDelete};
   const bool described =
       grdSetDeleteValFloat(header, kDelete) == 0 && grdSetDataType(header, 0) == 0 &&
       grdSetItemInfo(header, item, kItemType, "bathymetry", kMetre, 1) == 0 &&
       grdSetItemAxisEqD2(item, kMetre, b.nx, b.ny, 0.0f, 0.0f, b.dx, b.dy) == 0 &&
       grdAddCustomBlock(header, 1, "Q84_Misc", 7, misc) == 0 &&
-      grdSetGeoInfoUTMProj(header, b.projection.c_str(), b.longitude, b.latitude,
-                           b.orientation) == 0;
+      grdSetGeoInfoUTMProj(header, b.projection.c_str(), b.longitude, b.latitude, b.orientation) ==
+          0;
   if (!described) {
     *error = "cannot describe the file (grid size, spacing or origin out of range)";
     grdHeaderDestroy(&header);

@@ -5,27 +5,9 @@
 #include <string>
 #include <vector>
 
-#include "mkgrid/esri_ascii.h"
+#include "mkgrid/options.h"
 
 namespace karnet::mkgrid {
-
-enum class OriginSource {
-  Grid,        // the south-west cell centre of the .asc, in projected coordinates
-  Geographic,  // originA, originB are longitude and latitude in degrees
-  Projected,   // originA, originB are projected x and y
-};
-
-struct BuildOptions {
-  std::string projection = "LOCAL";
-  OriginSource origin = OriginSource::Grid;
-  double originA = 0.0;
-  double originB = 0.0;
-  bool hasOrientation = false;  // else the meridian convergence at the origin
-  double orientation = 0.0;
-  double landValue = 0.0;       // NODATA cells become this value
-  bool negate = false;          // store -value (grids of positive depths)
-  std::string title;
-};
 
 // A bathymetry ready to be written: node (i, j) is values[j * nx + i], j = 0
 // the southernmost row (the origin node's row).
@@ -43,17 +25,17 @@ struct Bathymetry {
   std::vector<float> values;
 };
 
-// Turns the .asc grid into a bathymetry: rows flipped to run south to north,
-// NODATA cells set to the land value, the origin placed on the earth through
-// the projection. false with a message when the projection is unusable or
-// the origin or a value cannot be represented.
-bool buildBathymetry(const EsriGrid& grid, const BuildOptions& options, Bathymetry* result,
-                     std::string* error);
+// Reads the source named in the options and makes the bathymetry: the grid
+// planned from the options, the source's values copied or resampled onto it,
+// NODATA nodes and nodes outside the source set to the land value. summary
+// tells what was read and chosen. false with a message naming the file or
+// option at fault.
+bool makeBathymetry(const MkgridOptions& options, Bathymetry* result, std::string* summary,
+                    std::string* error);
 
 // Writes the bathymetry file: item "bathymetry" on y and x, the "Q84_Misc"
 // block (orientation, land value) and the geographic information.
-bool writeBathymetry(const std::string& fileName, const Bathymetry& bathymetry,
-                     std::string* error);
+bool writeBathymetry(const std::string& fileName, const Bathymetry& bathymetry, std::string* error);
 
 }  // namespace karnet::mkgrid
 

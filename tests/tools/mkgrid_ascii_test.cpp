@@ -1,25 +1,26 @@
-// karnet-mkgrid: reading .asc grids, building the bathymetry, and the program.
+// karnet-mkgrid on ESRI ASCII grids: the strict reader and the grids made from them as they are.
+#include <cpl_conv.h>
 #include <gtest/gtest.h>
+#include <ogr_srs_api.h>
 
 #include <sstream>
 #include <string>
 #include <utility>
 #include <vector>
 
-#include "gridfile/nc_test_files.h"
 #include "input/bathymetry_read.h"
 #include "input/cartography.h"
 #include "mkgrid/esri_ascii.h"
-#include "mkgrid/grid_builder.h"
 #include "support/file_description.h"
 #include "support/float_grid.h"
+#include "tools/mkgrid_test_support.h"
 
 namespace karnet {
 namespace {
 
-using mkgrid::BuildOptions;
 using mkgrid::EsriGrid;
-using mkgrid::OriginSource;
+using test::quoted;
+using test::runMkgrid;
 
 // Four columns, three rows, the north row first; one NODATA cell.
 constexpr const char* kSmallGrid =
@@ -37,9 +38,10 @@ bool parse(const std::string& text, EsriGrid* grid, std::string* error) {
 TEST(MkgridAscii, HeaderVariants) {
   EsriGrid grid;
   std::string error;
-  ASSERT_TRUE(parse("NCOLS 2\r\nNROWS 2\r\nXLLCENTER -5.5\r\nyllcenter 7\r\nDX 10\r\ndy 20\r\n"
-                    "1 2 3\r\n4\r\n",
-                    &grid, &error))
+  ASSERT_TRUE(
+      parse("NCOLS 2\r\nNROWS 2\r\nXLLCENTER -5.5\r\nyllcenter 7\r\nDX 10\r\ndy 20\r\n"
+            "1 2 3\r\n4\r\n",
+            &grid, &error))
       << error;
   EXPECT_FALSE(grid.xIsCorner || grid.yIsCorner || grid.hasNodata);
   EXPECT_EQ(std::vector<double>({grid.xll, grid.yll, grid.dx, grid.dy}),
@@ -49,7 +51,8 @@ TEST(MkgridAscii, HeaderVariants) {
 
 TEST(MkgridAscii, FaultsAreNamed) {
   const std::string head = "ncols 2\nnrows 2\nxllcorner 0\nyllcorner 0\ncellsize 1\n";
-  const std::pair<std::string, const char*> cases[] = {  // text, part of the message
+  const std::pair<std::string, const char*> cases[] = {
+      // text, part of the message
       {head + "1 2 3\n", "expected 4 values"},
       {head + "1 2 3 4 5\n", "line 6: more values"},
       {head + "1 2 x 4\n", "line 6: bad grid value 'x'"},
@@ -70,57 +73,7 @@ TEST(MkgridAscii, FaultsAreNamed) {
   }
 }
 
-// Row order, land and the LOCAL origin by default are in the program's test.
-TEST(MkgridBuild, NegatedValuesOrientationAndGivenOrigin) {
-  EsriGrid grid;
-  std::string error;
-  ASSERT_TRUE(parse(kSmallGrid, &grid, &error));
-  BuildOptions options;
-  options.landValue = 2.5;
-  options.negate = true;
-  options.hasOrientation = true;
-  options.orientation = 30.0;
-  options.origin = OriginSource::Projected;
-  options.originA = 7.0;
-  options.originB = 8.0;
-  mkgrid::Bathymetry b;
-  ASSERT_TRUE(mkgrid::buildBathymetry(grid, options, &b, &error)) << error;
-  EXPECT_EQ(b.values, (std::vector<float>{8, 9, 10, 11, 4, 5, 6, 7, 1, 2, 3, 2.5f}));  // land kept
-  EXPECT_EQ(std::vector<double>({b.longitude, b.latitude, b.orientation, b.landValue}),
-            std::vector<double>({7, 8, 30, 2.5}));
-}
-
-TEST(MkgridBuild, ProjectedOriginGoesThroughTheProjection) {
-  EsriGrid grid;
-  std::string error;
-  ASSERT_TRUE(parse("ncols 1\nnrows 1\nxllcenter 600000\nyllcenter 6200000\ncellsize 100\n-3\n",
-                    &grid, &error));
-  BuildOptions options;
-  options.projection = "UTM-32";
-  mkgrid::Bathymetry b;
-  ASSERT_TRUE(mkgrid::buildBathymetry(grid, options, &b, &error)) << error;
-  Cartography map("UTM-32", 0, 0, 0);
-  double x = 0, y = 0;
-  map.geoToProj(b.longitude, b.latitude, &x, &y);
-  EXPECT_NEAR(x, 600000.0, 1e-4);
-  EXPECT_NEAR(y, 6200000.0, 1e-4);
-  // East of the central meridian: the grid's columns run along grid north,
-  // which lies clockwise of true north.
-  EXPECT_GT(b.orientation, 0.0);
-  EXPECT_NEAR(b.orientation, map.convergence(b.longitude, b.latitude), 1e-12);
-
-  options.projection = "NOT-A-PROJECTION";
-  EXPECT_FALSE(mkgrid::buildBathymetry(grid, options, &b, &error));
-  EXPECT_NE(error.find("unusable projection"), std::string::npos) << error;
-}
-
 class MkgridProgram : public test::ScratchTest {};
-
-// The program's output, stderr included, and its exit code.
-std::string runMkgrid(const std::string& arguments, int* exitCode) {
-  return test::commandOutput(std::string(KARNET_MKGRID_BINARY) + " " + arguments + " 2>&1",
-                             exitCode);
-}
 
 TEST_F(MkgridProgram, MakesAFileTheBathymetryReaderTakes) {
   test::writeBytes(file("in.asc"), kSmallGrid);
@@ -144,14 +97,83 @@ TEST_F(MkgridProgram, MakesAFileTheBathymetryReaderTakes) {
   descriptionFree(d);
 }
 
+// Negated values keep the land value as it is; a given orientation and
+// projected origin are stored as given (LOCAL: the origin is plain metres).
+TEST_F(MkgridProgram, NegatedValuesOrientationAndGivenOrigin) {
+  test::writeBytes(file("in.asc"), kSmallGrid);
+  int code = -1;
+  const std::string output = runMkgrid("--land-value 2.5 --negate -o 30 --origin-proj 7,8 " +
+                                           quoted(file("in.asc")) + " " + quoted(path),
+                                       &code);
+  ASSERT_EQ(code, 0) << output;
+  const test::MadeGrid b = test::readMadeGrid(path);
+  EXPECT_EQ(b.values, (std::vector<float>{8, 9, 10, 11, 4, 5, 6, 7, 1, 2, 3, 2.5f}));
+  EXPECT_EQ(std::vector<double>({b.longitude, b.latitude, b.orientation, b.landValue}),
+            std::vector<double>({7, 8, 30, 2.5}));
+}
+
+TEST_F(MkgridProgram, ProjectedOriginGoesThroughTheProjection) {
+  test::writeBytes(file("in.asc"),
+                   "ncols 1\nnrows 1\nxllcenter 600000\nyllcenter 6200000\ncellsize 100\n-3\n");
+  int code = -1;
+  std::string output = runMkgrid("-p UTM-32 " + quoted(file("in.asc")) + " " + quoted(path), &code);
+  ASSERT_EQ(code, 0) << output;
+  const test::MadeGrid b = test::readMadeGrid(path);
+  Cartography map("UTM-32", 0, 0, 0);
+  double x = 0, y = 0;
+  map.geoToProj(b.longitude, b.latitude, &x, &y);
+  EXPECT_NEAR(x, 600000.0, 1e-4);
+  EXPECT_NEAR(y, 6200000.0, 1e-4);
+  // East of the central meridian: the grid's columns run along grid north,
+  // which lies clockwise of true north.
+  EXPECT_GT(b.orientation, 0.0);
+  EXPECT_NEAR(b.orientation, map.convergence(b.longitude, b.latitude), 1e-12);
+
+  output = runMkgrid("-p NOT-A-PROJECTION " + quoted(file("in.asc")) + " " + quoted(file("x.nc")),
+                     &code);
+  EXPECT_EQ(code, 1);
+  EXPECT_NE(output.find("--projection 'NOT-A-PROJECTION' is unusable"), std::string::npos)
+      << output;
+}
+
+// A .prj file beside the grid gives it a CRS: the grid's projection by
+// default, and then the origin follows from it alone.
+TEST_F(MkgridProgram, ProjectionFileBesideTheGridIsItsCrs) {
+  test::writeBytes(file("in.asc"),
+                   "ncols 2\nnrows 1\nxllcorner 600000\nyllcorner 6200000\ncellsize 100\n-3 -4\n");
+  OGRSpatialReferenceH srs = OSRNewSpatialReference(nullptr);
+  OSRImportFromEPSG(srs, 32633);
+  OSRMorphToESRI(srs);
+  char* wkt = nullptr;
+  OSRExportToWkt(srs, &wkt);
+  test::writeBytes(file("in.prj"), wkt);
+  CPLFree(wkt);
+  OSRRelease(srs);
+  int code = -1;
+  std::string output = runMkgrid(quoted(file("in.asc")) + " " + quoted(path), &code);
+  ASSERT_EQ(code, 0) << output;
+  const test::MadeGrid b = test::readMadeGrid(path);
+  EXPECT_EQ(b.projection, "UTM-33");
+  EXPECT_EQ(b.values, (std::vector<float>{-3, -4}));
+  test::NodePlacer nodes(b);
+  EXPECT_NEAR(nodes.x0, 600050.0, 1e-4);
+  EXPECT_NEAR(nodes.y0, 6200050.0, 1e-4);
+
+  output =
+      runMkgrid("--origin-geo 9,55 " + quoted(file("in.asc")) + " " + quoted(file("x.nc")), &code);
+  EXPECT_EQ(code, 1);
+  EXPECT_NE(output.find("is georeferenced"), std::string::npos) << output;
+}
+
 TEST_F(MkgridProgram, BadInputEndsWithCodeOneAndAMessage) {
   test::writeBytes(file("in.asc"), kSmallGrid);
   test::writeBytes(file("bad.asc"), "ncols 2\nnrows 1\nxllcorner 0\nyllcorner 0\n");
   test::writeBytes(file("out.nc"), "earlier");
   const std::string in = "'" + file("in.asc") + "' ";
   const std::string out = "'" + file("out.nc") + "'";
-  const std::pair<std::string, const char*> cases[] = {  // arguments, part of the message
-      {"", "Usage: karnet-mkgrid [options] INPUT.asc OUTPUT.nc"},
+  const std::pair<std::string, const char*> cases[] = {
+      // arguments, part of the message
+      {"", "Usage: karnet-mkgrid [options] INPUT OUTPUT.nc"},
       {"--frobnicate " + in + out, "unknown option '--frobnicate'"},
       {"--land-value abc " + in + out, "bad land value 'abc'"},
       {"--origin-geo 10 " + in + out, "needs two numbers"},

@@ -1,0 +1,141 @@
+// The optimal-interpolation numerics against double-precision closed forms:
+// the correlation model, the weighted mean, the inverted correlation matrix
+// and the estimate itself, on two- and three-cell problems.
+#include <gtest/gtest.h>
+
+#include <array>
+#include <cmath>
+#include <vector>
+
+#include "analysis/correlation.h"
+#include "analysis/objan.h"
+#include "analysis/select_data.h"
+#include "analysis_fixtures.h"
+#include "common/closed_forms.h"
+
+namespace karnet {
+namespace {
+
+using testing::ScopedWorkspace;
+
+// Node spacing 250 m, decay length 500 m and zero crossing 1250 m: 2 and 5
+// nodes, so the cut-off lies beyond a squared distance of 80 * 2^2 = 320.
+constexpr double kD = 2.0, kZ = 5.0;
+
+RunSettings settings250(std::int32_t limit, float errorVariance) {
+  RunSettings s = testing::withLimit(limit);
+  s.dx = s.dy = 250.0f;
+  s.DecayDistance = 500.0f;
+  s.ZeroCrossingDistance = 1250.0f;
+  s.SearchRadius = 1e6f;
+  s.ErrorVariance = errorVariance;
+  return s;
+}
+
+// Agreement within float32 rounding: relative 1e-5, absolute 1e-6 near zero.
+void expectClose(double actual, double expected, const char* what) {
+  EXPECT_NEAR(actual, expected, 1e-5 * std::fabs(expected) + 1e-6) << what;
+}
+
+TEST(ObjanClosedForm, CorrelationAtNodeDistances) {
+  const RunSettings s = settings250(4, 0);
+  ScopedWorkspace w(0, 30, 30, s);
+  // Near, at the zero crossing, beyond it (negative), at and just beyond the
+  // cut-off, and far beyond.
+  for (const float d2 : {0.0f, 1.0f, 2.0f, 5.0f, 8.0f, 13.0f, 24.5f, 25.0f, 40.0f, 100.0f, 320.0f,
+                         320.5f, 800.0f}) {
+    const double expected = reference::correlation(d2, kD, kZ);
+    EXPECT_NEAR(correlation(d2, w.ws), expected, 1e-6 * std::fabs(expected) + 1e-30) << d2;
+    EXPECT_NEAR(tabledCorrelation(d2, w.ws), expected, 1e-6 * std::fabs(expected) + 1e-30) << d2;
+  }
+  EXPECT_LT(correlation(40.0f, w.ws), 0.0f);
+  EXPECT_EQ(correlation(320.5f, w.ws), 0.0f);
+}
+
+TEST(ObjanClosedForm, RemoveWeightedMeanDividesByTheSumOfAllEntries) {
+  // An arbitrary 3 x 3 block in a stride-4 matrix: mean = sum_ij a_ij v_j / sum_ij a_ij.
+  const RunSettings s = settings250(4, 0);
+  ScopedWorkspace w(0, 1, 1, s);
+  const double a[3][3] = {{1.5, -0.25, 0.5}, {0.75, 2.0, -1.0}, {0.1, 0.3, 0.9}};
+  const double v[3] = {4.0, -3.0, 10.0};
+  float values[3];
+  double total = 0, weighted = 0;
+  for (int i = 0; i < 3; ++i) {
+    values[i] = static_cast<float>(v[i]);
+    for (int j = 0; j < 3; ++j) {
+      w.ws.matrix[i * 4 + j] = static_cast<float>(a[i][j]);
+      total += a[i][j];
+      weighted += a[i][j] * v[j];
+    }
+    w.ws.matrix[i * 4 + 3] = 1e6f;  // outside the block: never read
+  }
+  float mean = 0, weightSum = 0;
+  removeWeightedMean(w.ws, w.ws.matrix, values, 3, mean, weightSum);
+  expectClose(mean, weighted / total, "mean");
+  expectClose(weightSum, total, "weight sum");
+  for (int i = 0; i < 3; ++i) expectClose(values[i], v[i] - weighted / total, "value");
+}
+
+TEST(ObjanClosedForm, CorrelationMatrixIsInvertedWithTheErrorTermOnItsDiagonal) {
+  // Cells at (0, 0), (1, 2), (4, 0): the inverse times the matrix built in
+  // double precision is the identity.
+  const double x[3] = {0, 1, 4}, y[3] = {0, 2, 0};
+  for (const float errorVariance : {0.0f, 10.0f, 40.0f}) {
+    const RunSettings s = settings250(5, errorVariance);
+    ScopedWorkspace w(0, 1, 1, s);
+    for (int i = 0; i < 3; ++i) {
+      w.ws.selX[i] = static_cast<float>(x[i]);
+      w.ws.selY[i] = static_cast<float>(y[i]);
+    }
+    ASSERT_EQ(buildCorrelationMatrix(w.ws, 3, s), 0);
+    for (int i = 0; i < 3; ++i) {
+      for (int j = 0; j < 3; ++j) {
+        double product = 0;
+        for (int q = 0; q < 3; ++q) {
+          const double r2 = (x[q] - x[j]) * (x[q] - x[j]) + (y[q] - y[j]) * (y[q] - y[j]);
+          const double c = reference::correlation(r2, kD, kZ) + (q == j ? errorVariance / 100 : 0);
+          product += w.ws.matrix[i * 5 + q] * c;
+        }
+        EXPECT_NEAR(product, i == j ? 1.0 : 0.0, 1e-5) << errorVariance << ": " << i << j;
+      }
+    }
+  }
+}
+
+TEST(ObjanClosedForm, EstimateFromTwoToSixCells) {
+  using Cells = std::vector<reference::Cell>;
+  const struct {
+    const char* what;
+    Cells cells;  // in collection order, on whole nodes
+    int j, k;     // the node estimated
+    float errorVariance;
+  } cases[] = {
+      {"two cells, node between", {{1, 1, 10}, {4, 2, 16}}, 2, 2, 10},
+      {"two cells, node on one of them", {{1, 1, 10}, {4, 2, 16}}, 4, 2, 10},
+      {"two cells without error term", {{1, 1, 10}, {4, 2, 16}}, 3, 1, 0},
+      {"three cells, one beyond the zero crossing", {{0, 0, 5}, {2, 1, 9}, {9, 3, -2}}, 3, 0, 5},
+      {"three cells, large error term", {{0, 0, 5}, {2, 1, 9}, {3, 3, 12}}, 1, 2, 60},
+      // The node lies beyond the cut-off of the first cell (r2 = 333).
+      {"three cells, one beyond the cut-off", {{0, 0, 20}, {15, 10, 7}, {17, 12, 11}}, 18, 3, 10},
+      {"six cells", {{0, 0, 1}, {1, 3, 4}, {2, 1, -2}, {4, 4, 8}, {5, 0, 3}, {6, 2, 5}}, 3, 2, 10},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.what);
+    const RunSettings s = settings250(8, c.errorVariance);
+    ScopedWorkspace w(static_cast<std::int32_t>(c.cells.size()), 30, 30, s);
+    std::vector<std::array<float, 3>> cells;
+    for (const auto& cell : c.cells)
+      cells.push_back({float(cell.x), float(cell.y), float(cell.value)});
+    w.setCells(cells);
+    const std::int32_t m = selectData(w.ws, c.j, c.k, s);
+    ASSERT_EQ(m, static_cast<std::int32_t>(c.cells.size()));
+    float estimate = -999.0f;
+    ASSERT_EQ(OBJAN(w.ws, m, &estimate, s), 0);
+    expectClose(estimate,
+                reference::optimalInterpolation(c.cells, c.j, c.k, kD, kZ, c.errorVariance),
+                c.what);
+  }
+}
+
+}  // namespace
+}  // namespace karnet
