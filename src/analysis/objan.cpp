@@ -72,12 +72,12 @@ std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSe
     return -1;
   }
   std::int32_t inverted = 0;
-  if (cache != nullptr && cache->holds(ws.candIndex, m)) {
+  if (cache != nullptr && cache->holds(ws.selIndex, m)) {
     inverted = cache->result;
     ws.errorText = cache->errorText;
   } else {
     inverted = buildCorrelationMatrix(ws, m, settings);
-    if (cache != nullptr) cache->keep(ws.candIndex, m, inverted, ws.errorText);
+    if (cache != nullptr) cache->keep(ws.selIndex, m, inverted, ws.errorText);
   }
   if (inverted != 0) return -1;
 

@@ -29,7 +29,7 @@ struct InverseCache {
 // success; returns -1 and leaves *estimate alone on failure, with ws.errorText
 // naming the reason. ws.selValue is left with the mean removed.
 // With a cache, the matrix is not built and inverted again when the chosen
-// cells (ws.candIndex[0..m-1]) are those of the cache's inverse, which must
+// cells (ws.selIndex[0..m-1]) are those of the cache's inverse, which must
 // then still be in ws.matrix; the estimate is the same bit for bit.
 std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSettings& settings,
                    InverseCache* cache = nullptr);

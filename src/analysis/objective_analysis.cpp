@@ -54,17 +54,22 @@ void collectDataCells(OaWorkspace& ws, const FloatGrid2D& grid, std::int32_t nDa
   ws.dataCount = collected;
 }
 
-// The storage of one thread's estimates: the candidate and chosen-cell arrays,
-// the matrix and the pivot records, and the inverse it last computed. It
-// works on a copy of the layer's workspace whose per-node arrays point here;
-// the layer's data cells, column index and correlation table stay shared and
-// are only read.
+// The storage of one thread's estimates: the candidate and chosen-cell arrays
+// and sort keys, the matrix and the pivot records, the selection's column
+// cursors and row reaches (carried from node to node along the thread's own
+// walk), and the inverse it last computed. It works on a copy of the layer's
+// workspace whose per-node arrays point here; the layer's data cells, column
+// index and correlation table stay shared and are only read.
 class NodeScratch {
  public:
   explicit NodeScratch(const OaWorkspace& layer)
       : ws(layer),
         candIndex_(entries(layer.dataCapacity)),
         candCorr_(entries(layer.dataCapacity)),
+        candKey_(entries(layer.dataCapacity)),
+        columnCursor_(entries(layer.columnCount)),
+        rowReach_(entries(layer.columnCount)),
+        selIndex_(entries(layer.limit)),
         selX_(entries(layer.limit)),
         selY_(entries(layer.limit)),
         selValue_(entries(layer.limit)),
@@ -74,6 +79,14 @@ class NodeScratch {
         chosen_(entries(layer.limit)) {
     ws.candIndex = candIndex_.data();
     ws.candCorr = candCorr_.data();
+    ws.candKey = candKey_.data();
+    // Cursors and row reaches start afresh on every thread.
+    if (layer.columnCursor != nullptr) ws.columnCursor = columnCursor_.data();
+    if (layer.rowReach != nullptr) ws.rowReach = rowReach_.data();
+    ws.cursorJ = -1;
+    ws.cursorK = 0;
+    ws.rowReachCount = 0;
+    ws.selIndex = selIndex_.data();
     ws.selX = selX_.data();
     ws.selY = selY_.data();
     ws.selValue = selValue_.data();
@@ -94,6 +107,10 @@ class NodeScratch {
   }
   std::vector<std::int32_t> candIndex_;
   std::vector<float> candCorr_;
+  std::vector<std::uint64_t> candKey_;
+  std::vector<std::int32_t> columnCursor_;
+  std::vector<std::int32_t> rowReach_;
+  std::vector<std::int32_t> selIndex_;
   std::vector<float> selX_, selY_, selValue_, selCorr_;
   std::vector<float> matrix_;
   std::vector<std::int32_t> pivot_;

@@ -122,7 +122,7 @@ TEST(InverseCache, KeptInverseGivesTheEstimateOfAFreshOne) {
     for (std::int32_t k = 0; k < RandomLayer::nk; ++k) {
       const std::int32_t m = selectData(cached.ws, j, k, s);
       ASSERT_EQ(selectData(fresh.ws, j, k, s), m);
-      const bool same = cache.holds(cached.ws.candIndex, m);
+      const bool same = cache.holds(cached.ws.selIndex, m);
       float a = -7.0f, b = -7.0f;
       const std::int32_t ra = OBJAN(cached.ws, m, &a, s, &cache);
       const std::int32_t rb = OBJAN(fresh.ws, m, &b, s);
