@@ -4,6 +4,7 @@
 #include <cstdlib>
 #include <new>
 #include <stdexcept>
+#include <string>
 
 #include "analysis/objective_analysis.h"
 #include "control/log.h"
@@ -129,6 +130,10 @@ void runProgram(const char* parameterFile, const RunInvocation& invocation) {
     endRun(error);
   } catch (const std::bad_alloc&) {
     endRun(RunError::memory("Memory exhausted\n"));
+  } catch (const std::exception& error) {
+    // Nothing below throws anything else on purpose; should it happen, the run
+    // still ends through its report rather than by an abort.
+    endRun(RunError::fatal(std::string("ERROR: ") + error.what()));
   }
   exitRun(0);
 }
