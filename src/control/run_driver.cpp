@@ -54,6 +54,13 @@ void setupRun(const char* parameterFile, Run& run) {
   if (checkRunSettings(run.parameters, run.settings, message, sizeof message) == 0) {
     throw RunError::fatal(message);
   }
+  // The result replaces whatever file has its name: one of the run's own files
+  // is refused before anything is computed.
+  if (resultIsOwnFile(run.parameters, parameterFile)) {
+    std::snprintf(message, sizeof message, "ERROR: result file %s is one of the run's own files",
+                  run.parameters.outputData.FileName);
+    throw RunError::fatal(message);
+  }
 
   // One projection object serves the whole run: its conversions do not depend
   // on the position it was placed at.

@@ -1,10 +1,12 @@
 #include "params/run_setup.h"
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cstdio>
 #include <cstring>
 
+#include "control/command_line.h"
 #include "params/run_parameters.h"
 #include "params/run_settings.h"
 #include "support/date_time.h"
@@ -19,7 +21,33 @@ void copyText(char* destination, std::size_t size, const char* source) {
   destination[n] = '\0';
 }
 
-bool readable(const char* path) { return path[0] != '\0' && ::access(path, R_OK) == 0; }
+// Inputs must be readable regular files: a FIFO or a device would block the run
+// or never end.
+bool readable(const char* path) {
+  struct stat info;
+  return path[0] != '\0' && ::access(path, R_OK) == 0 && ::stat(path, &info) == 0 &&
+         S_ISREG(info.st_mode);
+}
+
+// True when both names lead to one existing file (also through links).
+bool sameFile(const char* a, const char* b) {
+  struct stat first, second;
+  return a[0] != '\0' && b[0] != '\0' && ::stat(a, &first) == 0 && ::stat(b, &second) == 0 &&
+         first.st_dev == second.st_dev && first.st_ino == second.st_ino;
+}
+
+}  // namespace
+
+bool resultIsOwnFile(const RunParameters& parameters, const char* parameterFile) {
+  const char* result = parameters.outputData.FileName;
+  char logFileName[kFileNameSize];
+  const bool hasLog = makeLogFileName(parameterFile, logFileName) != 0;
+  return sameFile(result, parameters.inputFiles.FileName) ||
+         sameFile(result, parameters.inputFiles.DataFileName) ||
+         sameFile(result, parameterFile) || (hasLog && sameFile(result, logFileName));
+}
+
+namespace {
 
 }  // namespace
 

@@ -14,6 +14,10 @@ struct RunSettings;
 void deriveSettings(const RunParameters& parameters, const FileDescription& bathymetry,
                     RunSettings& settings);
 
+// True when the result file's name leads to one of the run's own files (an
+// input, the parameter file or its log): writing the result would destroy it.
+bool resultIsOwnFile(const RunParameters& parameters, const char* parameterFile);
+
 // 1 when every rule holds; otherwise 0 with the message in buffer.
 int checkRunSettings(const RunParameters& parameters, const RunSettings& settings, char* buffer,
                      std::size_t size);
