@@ -7,7 +7,6 @@
 
 #include <cstdio>
 #include <cstdlib>
-#include <string>
 
 #include "control/command_line.h"
 #include "control/cross_validate_run.h"
@@ -15,11 +14,12 @@
 #include "control/log.h"
 #include "control/run_driver.h"
 #include "control/termination.h"
-#include "params/run_setup.h"
+#include "control/threads.h"
 
 namespace {
 
 constexpr char kUsage[] = "Usage: karnet.exe [//apv] [options] pfs-file";
+constexpr char kThreadsError[] = "--threads and KARNET_THREADS take a number from 1 to 4096";
 
 constexpr char kHelp[] =
     "\n"
@@ -41,6 +41,9 @@ constexpr char kHelp[] =
     "             values (DecayDistance, ZeroCrossingDistance, ErrorVariance,\n"
     "             CorrelationSampleSize, SearchRadius, MinData, MaxData); the table,\n"
     "             best combination marked, goes to stdout and CASE_sweep.csv\n"
+    "  --threads N\n"
+    "             threads of the computation (default: KARNET_THREADS, else all\n"
+    "             cores); the result is the same for any number\n"
     "  --help     this text\n"
     "  --version  the program's version\n"
     "\n"
@@ -68,8 +71,13 @@ karnet::CrossValidationRequest crossValidation;
 [[noreturn]] void runMain(int count, char** arguments) {
   char parameterFile[karnet::kFileNameSize];
   if (karnet::selectParameterFile(count, arguments, parameterFile) == 0) {
-    karnet::fatalError(kUsage);
+    karnet::endRun(karnet::RunError::fatal(kUsage));
   }
+  int threads = 0;
+  if (karnet::selectThreadCount(count, arguments, std::getenv("KARNET_THREADS"), &threads) == 0) {
+    karnet::endRun(karnet::RunError::fatal(kThreadsError));
+  }
+  if (threads == 0) threads = karnet::defaultThreadCount();
 
   char logFileName[karnet::kFileNameSize];
   std::FILE* log = nullptr;
@@ -84,9 +92,9 @@ karnet::CrossValidationRequest crossValidation;
   karnet::RunInvocation invocation;
   invocation.commandLine = karnet::commandLineText(programPath, count, arguments);
   invocation.quiet = karnet::hasQuietArgument(count, arguments);
-  karnet::setupRun(parameterFile);
-  if (crossValidation.active) karnet::crossValidateDriver(crossValidation, parameterFile);
-  karnet::runDriver(invocation);
+  invocation.threads = threads;
+  invocation.crossValidation = crossValidation;
+  karnet::runProgram(parameterFile, invocation);
 }
 
 int hostEntry() { runMain(argumentCount, argumentVector); }

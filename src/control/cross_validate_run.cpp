@@ -6,13 +6,11 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <cmath>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <thread>
 
 #include "control/log.h"
 #include "control/progress.h"
@@ -23,8 +21,9 @@
 #include "input/data_scan.h"
 #include "input/run_initialise.h"
 #include "interp/setadj.h"
-#include "params/run_parameters.h"
+#include "state/run_context.h"
 #include "state/run_state.h"
+#include "support/run_error.h"
 
 namespace karnet {
 namespace {
@@ -144,18 +143,6 @@ void setKeyword(RunSettings& s, const std::string& name, double value) {
   if (name == "MaxData") s.MaxData = single;
 }
 
-// Threads for the cross-validation: OMP_NUM_THREADS when it names a count
-// (the same setting as the analysis' threads), else the processors.
-std::int32_t threadCount() {
-  long threads = static_cast<long>(std::thread::hardware_concurrency());
-  if (const char* text = std::getenv("OMP_NUM_THREADS"); text != nullptr) {
-    char* end = nullptr;
-    const long asked = std::strtol(text, &end, 10);
-    if (end != text && asked > 0) threads = asked;
-  }
-  return static_cast<std::int32_t>(std::clamp<long>(threads, 1, 1024));
-}
-
 // Writes text to path through a temporary file in the same directory, so that
 // path never holds a partial table. false when it could not.
 bool writeWhole(const std::string& path, const std::string& text) {
@@ -270,25 +257,27 @@ std::string besideParameterFile(const std::string& parameterFile, const std::str
   return parameterFile.substr(0, stem) + suffix;
 }
 
-void crossValidateDriver(const CrossValidationRequest& request, const char* parameterFile) {
-  const RunSettings& base = runSettings;
+void crossValidateRun(Run& run, const char* parameterFile) {
+  const RunSettings& base = run.settings;
   if (base.Analysis != 0) {
-    fatalError("Cross-validation needs objective analysis (Analysis is bilinear)");
+    throw RunError::fatal("Cross-validation needs objective analysis (Analysis is bilinear)");
   }
-  const std::vector<RunSettings> trials = sweepTrials(base, request.sweep);
+  const std::vector<RunSettings> trials = sweepTrials(base, run.invocation.crossValidation.sweep);
   // A swept range must not pass off a combination that a run would refuse.
   for (const RunSettings& trial : trials) {
     if (!(trial.DecayDistance > 0.0f && trial.ZeroCrossingDistance > 0.0f)) {
-      fatalError("Cross-validation needs DecayDistance and ZeroCrossingDistance above 0");
+      throw RunError::fatal(
+          "Cross-validation needs DecayDistance and ZeroCrossingDistance above 0");
     }
   }
 
   installSignalHandlers();
-  RunState& state = runState();
-  runInitialise(state, base);
+  RunState& state = run.state;
+  const RunContext context{run.settings, runLog(), run.cartography.get(), run.invocation.threads};
+  runInitialise(state, context);
   std::int32_t lastObs = -1, jOff = 0, kOff = 0, lOff = 0;
   progressStatus("Scanning data ...");
-  dataScan(state, base, runParameters.inputFiles.FileName, &lastObs, &jOff, &kOff, &lOff);
+  dataScan(state, context, run.parameters.inputFiles.FileName, &lastObs, &jOff, &kOff, &lOff);
   progressStatus("Scanning bathymetry ...");
   bathymetryScan(jOff, kOff, lOff, state, base);
   progressStatus("Initialising ...");
@@ -305,19 +294,17 @@ void crossValidateDriver(const CrossValidationRequest& request, const char* para
   input.lOff = lOff;
   const std::int64_t casts = countValidatedCasts(input, base);
   if (casts == 0) {
-    fatalError("Cross-validation: no cast has data at a wet node of the grid");
+    throw RunError::fatal("Cross-validation: no cast has data at a wet node of the grid");
   }
-  const std::vector<CvResult> results = crossValidate(input, trials, threadCount());
+  const std::vector<CvResult> results = crossValidate(input, trials, context.threads);
 
-  const bool sweep = !request.sweep.empty();
+  const std::vector<SweepKeyword>& sweepKeywords = run.invocation.crossValidation.sweep;
+  const bool sweep = !sweepKeywords.empty();
   const std::string csvPath =
       besideParameterFile(parameterFile, sweep ? "_sweep.csv" : "_cv.csv");
-  const std::string csv = sweep ? cvSweepCsv(results, trials, request.sweep)
+  const std::string csv = sweep ? cvSweepCsv(results, trials, sweepKeywords)
                                 : cvLevelCsv(results.front(), base);
-  if (!writeWhole(csvPath, csv)) {
-    const std::string message = "Can't write " + csvPath;
-    fatalError(message.c_str());
-  }
+  if (!writeWhole(csvPath, csv)) throw RunError::fatal("Can't write " + csvPath);
 
   char heading[512];
   if (sweep) {
@@ -329,22 +316,22 @@ void crossValidateDriver(const CrossValidationRequest& request, const char* para
                   "Cross-validation: %lld casts left out one at a time\n",
                   static_cast<long long>(casts));
   }
-  const std::string table = sweep ? cvSweepText(results, trials, request.sweep)
+  const std::string table = sweep ? cvSweepText(results, trials, sweepKeywords)
                                   : cvLevelText(results.front(), base);
   std::fputs(heading, stdout);
   std::fputs(table.c_str(), stdout);
   std::printf("Table written to %s\n", csvPath.c_str());
   std::fflush(stdout);
 
-  logPrintf("\n-------------------------------------------------\n");
-  logWrite(heading);
-  logWrite(table.c_str());
-  logPrintf("Table written to %s\n", csvPath.c_str());
-  logPrintf("-------------------------------------------------\n\n");
+  Report& report = context.report;
+  report.printf("\n-------------------------------------------------\n");
+  report.write(heading);
+  report.write(table.c_str());
+  report.printf("Table written to %s\n", csvPath.c_str());
+  report.printf("-------------------------------------------------\n\n");
 
   freeRunArrays(state);
   restoreSignalHandlers();
-  exitRun(0);
 }
 
 }  // namespace karnet

@@ -11,6 +11,8 @@
 
 namespace karnet {
 
+struct Run;
+
 // Most combinations one sweep may ask for.
 inline constexpr std::size_t kMaxSweepCombinations = 1000;
 
@@ -55,13 +57,13 @@ std::string cvSweepText(const std::vector<CvResult>& results,
 // suffix ("case.pfs", "_cv.csv" -> "case_cv.csv").
 std::string besideParameterFile(const std::string& parameterFile, const std::string& suffix);
 
-// Runs the cross-validation of the parameter file that setupRun has read:
-// data scan, bathymetry scan and observation gridding as in a run, then the
-// leave-one-cast-out estimates for every trial. Prints the table on stdout,
-// writes it as CSV beside the parameter file and into the log, and ends the
-// process (0, or 1 on any error). No result file is written.
-[[noreturn]] void crossValidateDriver(const CrossValidationRequest& request,
-                                      const char* parameterFile);
+// Runs the cross-validation of the parameter file that setupRun has read
+// into run: data scan, bathymetry scan and observation gridding as in a run,
+// then the leave-one-cast-out estimates for every trial of the request, on
+// run.invocation.threads threads. Prints the table on stdout, writes it as CSV
+// beside the parameter file and into the log. No result file is written.
+// Throws a RunError on failure.
+void crossValidateRun(Run& run, const char* parameterFile);
 
 }  // namespace karnet
 
