@@ -9,15 +9,17 @@
 #include <cstdlib>
 
 #include "control/command_line.h"
+#include "control/cross_validate_run.h"
 #include "control/host.h"
 #include "control/log.h"
 #include "control/run_driver.h"
 #include "control/termination.h"
-#include "params/run_setup.h"
+#include "control/threads.h"
 
 namespace {
 
 constexpr char kUsage[] = "Usage: karnet.exe [//apv] [options] pfs-file";
+constexpr char kThreadsError[] = "--threads and KARNET_THREADS take a number from 1 to 4096";
 
 constexpr char kHelp[] =
     "\n"
@@ -30,6 +32,18 @@ constexpr char kHelp[] =
     "  //apv      run under the progress display; q or SIGUSR1 cancels the run\n"
     "  --quiet    no summary (result, grid, observations) on stderr at the end\n"
     "  -debug     accepted, without effect\n"
+    "  --cross-validate\n"
+    "             leave one cast out at a time and compare the objective analysis\n"
+    "             with it: RMS and bias per level on stdout and in CASE_cv.csv;\n"
+    "             no result file is written\n"
+    "  --sweep KEYWORD=V1,V2,... [KEYWORD=...]\n"
+    "             cross-validate every combination of these objective-analysis\n"
+    "             values (DecayDistance, ZeroCrossingDistance, ErrorVariance,\n"
+    "             CorrelationSampleSize, SearchRadius, MinData, MaxData); the table,\n"
+    "             best combination marked, goes to stdout and CASE_sweep.csv\n"
+    "  --threads N\n"
+    "             threads of the computation (default: KARNET_THREADS, else all\n"
+    "             cores); the result is the same for any number\n"
     "  --help     this text\n"
     "  --version  the program's version\n"
     "\n"
@@ -51,13 +65,19 @@ constexpr char kHelp[] =
 int argumentCount = 0;
 char** argumentVector = nullptr;
 const char* programPath = "karnet";
+karnet::CrossValidationRequest crossValidation;
 
 // Picks the parameter file, opens the log beside it, sets the run up and runs it.
 [[noreturn]] void runMain(int count, char** arguments) {
   char parameterFile[karnet::kFileNameSize];
   if (karnet::selectParameterFile(count, arguments, parameterFile) == 0) {
-    karnet::fatalError(kUsage);
+    karnet::endRun(karnet::RunError::fatal(kUsage));
   }
+  int threads = 0;
+  if (karnet::selectThreadCount(count, arguments, std::getenv("KARNET_THREADS"), &threads) == 0) {
+    karnet::endRun(karnet::RunError::fatal(kThreadsError));
+  }
+  if (threads == 0) threads = karnet::defaultThreadCount();
 
   char logFileName[karnet::kFileNameSize];
   std::FILE* log = nullptr;
@@ -72,8 +92,9 @@ const char* programPath = "karnet";
   karnet::RunInvocation invocation;
   invocation.commandLine = karnet::commandLineText(programPath, count, arguments);
   invocation.quiet = karnet::hasQuietArgument(count, arguments);
-  karnet::setupRun(parameterFile);
-  karnet::runDriver(invocation);
+  invocation.threads = threads;
+  invocation.crossValidation = crossValidation;
+  karnet::runProgram(parameterFile, invocation);
 }
 
 int hostEntry() { runMain(argumentCount, argumentVector); }
@@ -106,6 +127,13 @@ int main(int argc, char** argv) {
   setenv("H84", hostMode ? "APV" : "WIN", 1);
 
   if (answerInformationRequest(argumentCount, argumentVector)) return 0;
+
+  std::string problem;
+  if (!karnet::takeCrossValidationArguments(argumentCount, argumentVector, crossValidation,
+                                            problem)) {
+    std::fprintf(stderr, "karnet: %s\n%s\n", problem.c_str(), kUsage);
+    return 1;
+  }
 
   if (hostMode) {
     char programName[karnet::kFileNameSize] = "";

@@ -56,6 +56,12 @@ int grdSetDataType(GrdHeader* header, int dataType);
 int grdSetEqTimeAxis(GrdHeader* header, int unit, double start, double step, int firstStep);
 int grdSetItemInfo(GrdHeader* header, GrdItem* item, std::int32_t itemType, const char* key,
                    std::int32_t unit, int flag);
+// Extra text attributes of an item, written after those grdSetItemInfo gives
+// it; a name it already has (long_name, units) is replaced.
+int grdSetItemAttribute(GrdItem* item, const char* name, const char* text);
+// Names item `ancillary` (of the same header) in the item's CF
+// ancillary_variables attribute.
+int grdSetItemAncillary(GrdItem* item, GrdItem* ancillary);
 int grdSetItemAxisEqD3(GrdItem* item, int axisUnit, std::int32_t nx, std::int32_t ny,
                        std::int32_t nz, float x0, float y0, float z0, float dx, float dy,
                        float dz);
@@ -96,6 +102,9 @@ int grdSetGeoreference(GrdHeader* header, const GrdGeoreference& georeference);
 // grdSetEqTimeAxis the file has no time dimension and takes one step.
 int grdFileCreate(const char* fileName, GrdHeader* header, GrdFile** file);
 int grdWriteItemTimeStep(GrdHeader* header, GrdFile* file, double time, const float* data);
+// Writes the next time step of item itemNumber (from 1; item 1 as above).
+int grdWriteItemNTimeStep(GrdHeader* header, GrdFile* file, int itemNumber, double time,
+                          const float* data);
 // Closes the file; a complete file is renamed to its final name. Sets *file to null.
 // reason, when given, says why the file could not be put in place.
 int grdFileClose(GrdHeader* header, GrdFile** file, std::string* reason = nullptr);

@@ -11,6 +11,16 @@
 namespace karnet {
 namespace {
 
+// Item type "Undefined": no standard name, dimensionless.
+constexpr std::int32_t kUnitlessItemType = 1;
+
+constexpr char kErrorComment[] =
+    "ordinary-kriging error variance of the objective-analysis estimate relative to the "
+    "signal variance, 1 - r'A^-1 r + (1 - 1'A^-1 r)^2 / (1'A^-1 1), clipped to [0, 1]; "
+    "r: correlations of the node with the data cells used, A: their correlation matrix with "
+    "the error variance on its diagonal; before smoothing and clipping of the estimate; "
+    "fill value where the node got no estimate";
+
 // Every header call up to the file's creation; the first failure stops them.
 int describeResult(GrdHeader* header, const FileDescription& d, std::int32_t itemType,
                    const char* projection, const TextAttributes* attributes) {
@@ -44,22 +54,51 @@ int describeResult(GrdHeader* header, const FileDescription& d, std::int32_t ite
   return grdSetGeoreference(header, georeference);
 }
 
+// The error field as item 2: named after item 1 with "_error", unitless,
+// linked from item 1 as its ancillary variable.
+int describeErrorItem(GrdHeader* header, const FileDescription& d, std::int32_t itemType) {
+  std::string key;
+  unitGetItemTypeKey(itemType, &key);
+  if (key.empty()) key = std::string("item_").append(std::to_string(itemType));
+  const std::string name = key + "_error";
+  const std::string longName = "relative error variance of the " + key + " estimate";
+  GrdItem* item = grdItemD(header, 1);
+  GrdItem* error = grdItemD(header, 2);
+  if (item == nullptr || error == nullptr) return 1;
+  if (grdSetItemInfo(header, error, kUnitlessItemType, name.c_str(), 0, 1) != 0) return 1;
+  if (grdSetItemUnitConversion(error, 3, 0) != 0) return 1;
+  if (grdSetItemAxisEqD3(error, 1000, d.axes[1].lastIndex + 1, d.axes[2].lastIndex + 1,
+                         d.axes[3].lastIndex + 1, 0.0f, 0.0f, 0.0f, d.axes[1].spacing,
+                         d.axes[2].spacing, d.axes[3].spacing) != 0) {
+    return 1;
+  }
+  if (grdSetItemAttribute(error, "long_name", longName.c_str()) != 0 ||
+      grdSetItemAttribute(error, "units", "1") != 0 ||
+      grdSetItemAttribute(error, "comment", kErrorComment) != 0 ||
+      grdSetItemAncillary(item, error) != 0) {
+    return 1;
+  }
+  return 0;
+}
+
 }  // namespace
 
 int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
                 std::int32_t itemType, const FloatGrid3D& values, const char* projection,
-                const TextAttributes* globalAttributes, std::string* reason) {
+                const TextAttributes* globalAttributes, const FloatGrid3D* errorValues,
+                std::string* reason) {
   std::string ignored;
   if (reason == nullptr) reason = &ignored;
   grdInitSystem();
   GrdHeader* header = nullptr;
-  if (grdHeaderCreate(1, fileName, "", 1, 1, 2, &header) != 0) {
+  if (grdHeaderCreate(errorValues != nullptr ? 2 : 1, fileName, "", 1, 1, 2, &header) != 0) {
     grdHeaderDestroy(&header);
     *reason = "cannot be described";
     return 0;
   }
   GrdFile* file = nullptr;
-  if (describeResult(header, description, itemType, projection, globalAttributes) != 0) {
+  if (describeResult(header, description, itemType, projection, globalAttributes) != 0 ||
+      (errorValues != nullptr && describeErrorItem(header, description, itemType) != 0)) {
     grdHeaderDestroy(&header);
     *reason = "its layout cannot be described (axes, projection or attributes)";
     return 0;
@@ -70,7 +109,10 @@ int resultWrite(const char* fileName, const FileDescription& description, int wr
     if (reason->empty()) *reason = "cannot be created";
     return 0;
   }
-  if (writeValues != 0 && grdWriteItemTimeStep(header, file, 0.0, values.data) != 0) {
+  if (writeValues != 0 &&
+      (grdWriteItemTimeStep(header, file, 0.0, values.data) != 0 ||
+       (errorValues != nullptr &&
+        grdWriteItemNTimeStep(header, file, 2, 0.0, errorValues->data) != 0))) {
     grdFileAbandon(header, &file);
     grdHeaderDestroy(&header);
     *reason = "its values cannot be written";

@@ -1,4 +1,4 @@
-// Reads the run's parameter file into runParameters and echoes every value to
+// Reads the run's parameter file into a RunParameters record and echoes every value to
 // the log as it goes.
 #include <cstdio>
 #include <cstring>
@@ -10,7 +10,6 @@
 
 namespace karnet {
 
-RunParameters runParameters;
 
 namespace {
 
@@ -168,9 +167,8 @@ int readOutputData(char* fileName, char* title, std::int32_t* itemType) {
   return 1;
 }
 
-int readAllSections() {
+int readAllSections(RunParameters& p) {
   const bool echo = logStream != nullptr;
-  RunParameters& p = runParameters;
 
   target = parTargetByNameNum(parameterFile, kTargetName, 1);
   if (target == nullptr) return noteLibraryFailure();
@@ -243,8 +241,8 @@ int readAllSections() {
 
 }  // namespace
 
-int readParameterFile(const char* path, std::string* problem) {
-  runParameters = RunParameters{};
+int readParameterFile(const char* path, RunParameters& parameters, std::string* problem) {
+  parameters = RunParameters{};
   failureCause.clear();
   auto tell = [problem](const char* text) {
     logWrite(text);
@@ -260,7 +258,7 @@ int readParameterFile(const char* path, std::string* problem) {
     tell(parErrorTextGlb());
     return 0;
   }
-  const int result = readAllSections();
+  const int result = readAllSections(parameters);
   closeParameterFile();
   if (result == 0) tell(failureCause.empty() ? "parameter file incomplete" : failureCause.c_str());
   return result;

@@ -51,14 +51,13 @@ struct RunParameters {
   OutputData outputData;
 };
 
-extern RunParameters runParameters;
-
-// Loads the file, reads the five sections into runParameters and echoes them to
+// Loads the file, reads the five sections into parameters and echoes them to
 // the log. 1 on success; on failure 0, after writing one cause line to the log
 // ("Can't open NAME" or "FILE:LINE: REASON").
-// problem, when given, receives what the log was told on failure ("NAME:LINE:
-// REASON", "Can't open NAME", ...), without its line end.
-int readParameterFile(const char* path, std::string* problem = nullptr);
+// problem, when given, receives what the log was told on failure, without its
+// line end.
+int readParameterFile(const char* path, RunParameters& parameters,
+                      std::string* problem = nullptr);
 
 }  // namespace karnet
 

@@ -8,20 +8,13 @@
 #include <string>
 
 #include "control/command_line.h"
-#include "control/termination.h"
-#include "input/bathymetry_read.h"
-#include "input/cartography.h"
 #include "params/run_parameters.h"
 #include "params/run_settings.h"
-#include "state/run_state.h"
 #include "support/date_time.h"
 #include "support/file_check.h"
 #include "support/file_description.h"
 
 namespace karnet {
-
-RunSettings runSettings;
-
 namespace {
 
 void copyText(char* destination, std::size_t size, const char* source) {
@@ -34,18 +27,6 @@ void copyText(char* destination, std::size_t size, const char* source) {
 // or never end.
 bool readable(const char* path) { return inputFileProblem(path).empty(); }
 
-// Names on the standard error stream each input that stops the run and why:
-// one that is no readable regular file, or a bathymetry that could not be read
-// (bathymetryProblem, empty when it was).
-void reportInputProblems(const std::string& bathymetryProblem) {
-  const char* bathymetry = runParameters.inputFiles.FileName;
-  const char* observations = runParameters.inputFiles.DataFileName;
-  std::string problem = inputFileProblem(bathymetry);
-  if (problem.empty()) problem = bathymetryProblem;
-  if (!problem.empty()) writeFileNotice(bathymetry, problem);
-  problem = inputFileProblem(observations);
-  if (!problem.empty()) writeFileNotice(observations, problem);
-}
 
 // True when both names lead to one existing file (also through links).
 bool sameFile(const char* a, const char* b) {
@@ -54,21 +35,22 @@ bool sameFile(const char* a, const char* b) {
          first.st_dev == second.st_dev && first.st_ino == second.st_ino;
 }
 
-// The result replaces whatever file has its name: when that is one of the
-// run's own files (an input, the parameter file or the log), the run would
-// destroy it, so it is refused before anything is computed.
-bool resultIsOwnFile(const char* parameterFile) {
-  const char* result = runParameters.outputData.FileName;
+}  // namespace
+
+bool resultIsOwnFile(const RunParameters& parameters, const char* parameterFile) {
+  const char* result = parameters.outputData.FileName;
   char logFileName[kFileNameSize];
   const bool hasLog = makeLogFileName(parameterFile, logFileName) != 0;
-  return sameFile(result, runParameters.inputFiles.FileName) ||
-         sameFile(result, runParameters.inputFiles.DataFileName) ||
+  return sameFile(result, parameters.inputFiles.FileName) ||
+         sameFile(result, parameters.inputFiles.DataFileName) ||
          sameFile(result, parameterFile) || (hasLog && sameFile(result, logFileName));
 }
 
-// Settings that come from the bathymetry header and the parameters.
-void deriveSettings(const FileDescription& bathymetry, RunSettings& s) {
-  const RunParameters& p = runParameters;
+namespace {
+
+}  // namespace
+
+void deriveSettings(const RunParameters& p, const FileDescription& bathymetry, RunSettings& s) {
   s.j0 = static_cast<std::int32_t>(bathymetry.axes[1].start);
   s.jx = s.j0 + bathymetry.axes[1].lastIndex;
   s.k0 = static_cast<std::int32_t>(bathymetry.axes[2].start);
@@ -98,6 +80,8 @@ void deriveSettings(const FileDescription& bathymetry, RunSettings& s) {
   copyText(s.projection, sizeof s.projection, p.inputFiles.Projection);
 }
 
+namespace {
+
 bool calculationParametersValid(const RunSettings& s) {
   if (0 > s.SearchRadius) return false;
   if (0 > s.MaxExtrapolationDistance[0] || 0 > s.MaxExtrapolationDistance[1]) return false;
@@ -112,10 +96,22 @@ bool calculationParametersValid(const RunSettings& s) {
 
 }  // namespace
 
-int checkRunSettings(char* buffer, std::size_t size) {
-  const RunSettings& s = runSettings;
-  if (!readable(runParameters.inputFiles.FileName) ||
-      !readable(runParameters.inputFiles.DataFileName)) {
+std::string inputProblemNotices(const RunParameters& parameters,
+                                const std::string& bathymetryProblem) {
+  const char* bathymetry = parameters.inputFiles.FileName;
+  const char* observations = parameters.inputFiles.DataFileName;
+  std::string notices;
+  std::string problem = inputFileProblem(bathymetry);
+  if (problem.empty()) problem = bathymetryProblem;
+  if (!problem.empty()) notices += fileNotice(bathymetry, problem);
+  problem = inputFileProblem(observations);
+  if (!problem.empty()) notices += fileNotice(observations, problem);
+  return notices;
+}
+
+int checkRunSettings(const RunParameters& parameters, const RunSettings& s, char* buffer,
+                     std::size_t size) {
+  if (!readable(parameters.inputFiles.FileName) || !readable(parameters.inputFiles.DataFileName)) {
     std::snprintf(buffer, size, "ERROR: in input file selection");
     return 0;
   }
@@ -148,48 +144,6 @@ int checkRunSettings(char* buffer, std::size_t size) {
   if (!calculationParametersValid(s)) {
     std::snprintf(buffer, size, "ERROR: in calculation parameters");
     return 0;
-  }
-  return 1;
-}
-
-int setupRun(const char* parameterFile) {
-  std::string parameterProblem;
-  if (readParameterFile(parameterFile, &parameterProblem) == 0) {
-    // The log holds the reason on the line before; the user sees it too.
-    writeNotice(parameterProblem);
-    fatalError("Error in parameter file");
-  }
-
-  FileDescription* bathymetry = descriptionNew(2);
-  if (bathymetry == nullptr) fatalError("Unable to allocate memory");
-  // A file that cannot be read leaves the description at its creation values,
-  // which the validation below rejects.
-  std::string bathymetryProblem;
-  bathymetryRead(runParameters.inputFiles.FileName, *bathymetry, 1, runState().bathymetryGrid,
-                 &bathymetryProblem);
-  deriveSettings(*bathymetry, runSettings);
-  runState().landValue = runSettings.landValue;
-
-  char message[1024];
-  if (checkRunSettings(message, sizeof message) == 0) {
-    reportInputProblems(bathymetryProblem);
-    fatalError(message);
-  }
-  if (resultIsOwnFile(parameterFile)) {
-    std::snprintf(message, sizeof message, "ERROR: result file %s is one of the run's own files",
-                  runParameters.outputData.FileName);
-    fatalError(message);
-  }
-
-  const double longitude = bathymetry->axes[1].origin;
-  const double latitude = bathymetry->axes[2].origin;
-  if (cartographyCreate(0.0, 0.0, runSettings.orientation, runSettings.projection) != 0) {
-    fatalError("Unable to initialize geo. system");
-  }
-  cartographyGeoToProj(longitude, latitude, &runSettings.xOrigo, &runSettings.yOrigo);
-  if (cartographyCreate(longitude, latitude, runSettings.orientation, runSettings.projection) !=
-      0) {
-    fatalError("Unable to initialize geo. system");
   }
   return 1;
 }

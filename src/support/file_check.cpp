@@ -4,7 +4,6 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstdio>
 #include <cstring>
 
 namespace karnet {
@@ -20,18 +19,10 @@ std::string inputFileProblem(const char* path) {
   return std::string();
 }
 
+std::string notice(const std::string& text) { return "karnet: " + text + "\n"; }
+
 std::string fileNotice(const std::string& file, const std::string& reason) {
-  return "karnet: " + file + ": " + reason + "\n";
-}
-
-void writeNotice(const std::string& text) {
-  const std::string line = "karnet: " + text + "\n";
-  std::fputs(line.c_str(), stderr);
-  std::fflush(stderr);
-}
-
-void writeFileNotice(const std::string& file, const std::string& reason) {
-  writeNotice(file + ": " + reason);
+  return notice(file + ": " + reason);
 }
 
 }  // namespace karnet

@@ -15,12 +15,9 @@ std::string inputFileProblem(const char* path);
 // stream: "karnet: FILE: REASON" and a line end.
 std::string fileNotice(const std::string& file, const std::string& reason);
 
-// Writes fileNotice(file, reason) to the standard error stream at once.
-void writeFileNotice(const std::string& file, const std::string& reason);
-
-// Writes "karnet: TEXT" and a line end to the standard error stream at once,
-// for a text that names its file itself ("case.pfs:3: ...").
-void writeNotice(const std::string& text);
+// "karnet: TEXT" and a line end, for a text that names its file itself
+// ("case.pfs:3: ...").
+std::string notice(const std::string& text);
 
 }  // namespace karnet
 
