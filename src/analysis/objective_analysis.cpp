@@ -10,6 +10,7 @@
 #include "analysis/select_data.h"
 #include "control/log.h"
 #include "control/progress.h"
+#include "control/ranks.h"
 #include "interp/node_tests.h"
 #include "interp/setadj.h"
 #include "support/float_grid.h"
@@ -156,6 +157,8 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
   std::int64_t interpolations = 0;
   std::int64_t failures = 0;
   for (std::int32_t l = lOff; l <= lLast; ++l) {
+    // Only the levels this process holds (all of them when it runs alone).
+    if (l < state.basicValues.l0 || l >= state.basicValues.l0 + state.basicValues.nl) continue;
     grid3DLayerGet(state.basicBathymetry, l, state.layerBathymetry);
     grid3DLayerGet(state.basicValues, l, state.layerValues);
     grid2DCopyWindow(analysisGrid, state.layerValues);
@@ -176,6 +179,13 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
     }
     grid3DLayerPut(state.basicValues, l, state.layerValues);
   }
+
+  // The counts of every process's levels.
+  std::int64_t sums[3] = {dataCells, interpolations, failures};
+  ranksSum(sums, 3);
+  dataCells = sums[0];
+  interpolations = sums[1];
+  failures = sums[2];
 
   logPrintf("\n");
   logPrintf("-------------------------------------------------\n");

@@ -11,6 +11,7 @@
 #include "control/command_line.h"
 #include "control/host.h"
 #include "control/log.h"
+#include "control/ranks.h"
 #include "control/run_driver.h"
 #include "control/termination.h"
 #include "params/run_setup.h"
@@ -61,7 +62,10 @@ const char* programPath = "karnet";
 
   char logFileName[karnet::kFileNameSize];
   std::FILE* log = nullptr;
-  if (karnet::makeLogFileName(parameterFile, logFileName) != 0) {
+  if (!karnet::rankLeads()) {
+    // In a run over several processes the first one keeps the log.
+    log = std::fopen("/dev/null", "w");
+  } else if (karnet::makeLogFileName(parameterFile, logFileName) != 0) {
     log = std::fopen(logFileName, "w");
   }
   // Line-buffered, so that a user (or a script) following the log sees each
@@ -96,16 +100,29 @@ bool answerInformationRequest(int count, char** arguments) {
 }  // namespace
 
 int main(int argc, char** argv) {
+  // Under an MPI launcher every process is one rank of the run; the first
+  // speaks for all of them: the others' messages and progress go nowhere.
+  karnet::ranksInit(&argc, &argv);
   // The platform hands the arguments already split; the program's own name is
   // not one of them.
   argumentCount = argc > 0 ? argc - 1 : 0;
   if (argc > 0 && argv[0] != nullptr) programPath = argv[0];
   argumentVector = argc > 0 ? argv + 1 : argv;
 
-  const bool hostMode = karnet::hasHostModeArgument(argumentCount, argumentVector);
+  if (!karnet::rankLeads()) {
+    if (std::freopen("/dev/null", "w", stdout) == nullptr ||
+        std::freopen("/dev/null", "w", stderr) == nullptr) {
+      karnet::ranksAbort(1);
+    }
+  }
+  const bool hostMode =
+      karnet::hasHostModeArgument(argumentCount, argumentVector) && karnet::rankLeads();
   setenv("H84", hostMode ? "APV" : "WIN", 1);
 
-  if (answerInformationRequest(argumentCount, argumentVector)) return 0;
+  if (answerInformationRequest(argumentCount, argumentVector)) {
+    karnet::ranksFinish();
+    return 0;
+  }
 
   if (hostMode) {
     char programName[karnet::kFileNameSize] = "";

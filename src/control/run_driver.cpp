@@ -6,6 +6,8 @@
 #include "analysis/objective_analysis.h"
 #include "control/log.h"
 #include "control/progress.h"
+#include "control/ranked_result.h"
+#include "control/ranks.h"
 #include "control/run_summary.h"
 #include "control/signals.h"
 #include "control/termination.h"
@@ -44,6 +46,8 @@ int runPhases(const RunInvocation& invocation, RunSummary* summary) {
   } else {
     interp(lastObs, jOff, kOff, lOff, state, settings);
   }
+  // Over several processes the levels meet only in the result file.
+  if (rankCount() > 1) return writeRankedResult(invocation, state, settings, tally, summary);
   glo2loc(jOff, kOff, lOff, state, settings);
   if (summary != nullptr) {
     summary->resultPath = runParameters.outputData.FileName;
@@ -70,14 +74,16 @@ void runDriver(const RunInvocation& invocation) {
   runInitialise(runState(), runSettings);
   RunSummary summary;
   const int written = runPhases(invocation, &summary);
-  // A run whose result could not be written has not produced what it was for.
-  if (written == 0) {
+  // A run whose result could not be written has not produced what it was for;
+  // every process of the run ends as the one that wrote it.
+  const std::int32_t failed = ranksAgreeOnEnd(written == 0 ? 1 : -1);
+  if (failed >= 0) {
     logWrite("\nERROR while writing result file\n");
-    exitRun(1);
+    exitRun(failed);
   }
   freeRunArrays(runState());
   restoreSignalHandlers();
-  printRunSummary(stderr, summary, invocation.quiet);
+  if (rankLeads()) printRunSummary(stderr, summary, invocation.quiet);
   exitRun(0);
 }
 

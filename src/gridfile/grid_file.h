@@ -94,6 +94,12 @@ int grdSetGeoreference(GrdHeader* header, const GrdGeoreference& georeference);
 // grdSetEqTimeAxis the file has no time dimension and takes one step.
 int grdFileCreate(const char* fileName, GrdHeader* header, GrdFile** file);
 int grdWriteItemTimeStep(GrdHeader* header, GrdFile* file, double time, const float* data);
+// The same time step level by level: grdWriteItemLevel stores z level `level`
+// (x fastest, then y) of the step being written, in any order, and
+// grdFinishItemTimeStep then sets the step's time and closes it. Writing the
+// levels in increasing order gives the same file as one grdWriteItemTimeStep.
+int grdWriteItemLevel(GrdHeader* header, GrdFile* file, std::int32_t level, const float* data);
+int grdFinishItemTimeStep(GrdHeader* header, GrdFile* file, double time);
 // Closes the file; a complete file is renamed to its final name. Sets *file to null.
 int grdFileClose(GrdHeader* header, GrdFile** file);
 // Drops a file that was created but must not appear; nothing of it reaches the disk.

@@ -559,6 +559,48 @@ int grdWriteItemTimeStep(GrdHeader* header, GrdFile* file, double time, const fl
   return 0;
 }
 
+int grdWriteItemLevel(GrdHeader* header, GrdFile* file, std::int32_t level, const float* data) {
+  if (!validOpenFile(header, file) || data == nullptr) return 1;
+  if (file->failed || (!file->hasTime && file->stepsWritten > 0)) return 1;
+  const GrdItem& item = *header->items[0];
+  if (item.axisDims != 3 || level < 0 || level >= item.counts[2]) return 1;
+  std::vector<std::size_t> start;
+  std::vector<std::size_t> count;
+  if (file->hasTime) {
+    start.push_back(file->stepsWritten);
+    count.push_back(1);
+  }
+  start.push_back(static_cast<std::size_t>(level));
+  count.push_back(1);
+  for (int d = 1; d >= 0; --d) {
+    start.push_back(0);
+    count.push_back(static_cast<std::size_t>(item.counts[d]));
+  }
+  NcStatus status;
+  status(nc_put_vara_float(file->ncid, file->itemVar, start.data(), count.data(), data));
+  if (!status.ok()) {
+    file->failed = true;
+    return 1;
+  }
+  return 0;
+}
+
+int grdFinishItemTimeStep(GrdHeader* header, GrdFile* file, double time) {
+  if (!validOpenFile(header, file)) return 1;
+  if (file->failed || (!file->hasTime && file->stepsWritten > 0)) return 1;
+  if (file->hasTime) {
+    NcStatus status;
+    const std::size_t index = file->stepsWritten;
+    status(nc_put_var1_double(file->ncid, file->timeVar, &index, &time));
+    if (!status.ok()) {
+      file->failed = true;
+      return 1;
+    }
+  }
+  ++file->stepsWritten;
+  return 0;
+}
+
 int grdFileClose(GrdHeader* header, GrdFile** file) {
   if (file == nullptr || *file == nullptr) return 1;
   if (!validOpenFile(header, *file)) return 1;

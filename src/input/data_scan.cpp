@@ -11,9 +11,11 @@
 
 #include "control/log.h"
 #include "control/progress.h"
+#include "control/ranks.h"
 #include "control/termination.h"
 #include "input/bathymetry_read.h"
 #include "input/cartography.h"
+#include "input/level_share.h"
 #include "params/run_settings.h"
 #include "state/run_state.h"
 #include "support/file_description.h"
@@ -306,13 +308,17 @@ void dataScan(RunState& state, const RunSettings& s, const char* bathymetryFile,
   const auto nj = static_cast<std::int32_t>(ax.count);
   const auto nk = static_cast<std::int32_t>(ay.count);
   const auto nl = static_cast<std::int32_t>(az.count);
+  // Each process holds the levels it works on; alone, it holds them all.
+  const LevelRange held =
+      shareBasicLevels(state, s, nl, *jOff, *kOff, *lOff, rankCount(), rankIndex());
   for (FloatGrid3D* g : {&state.basicBathymetry, &state.basicValues}) {
     *g = FloatGrid3D{};
     g->nj = nj;
     g->nk = nk;
-    g->nl = nl;
-    g->total = std::int64_t{nj} * nk * nl;
-    grid3DAlloc(*g);
+    g->l0 = held.first;
+    g->nl = held.count;
+    g->total = std::int64_t{nj} * nk * held.count;
+    if (g->total > 0) grid3DAlloc(*g);
   }
   for (FloatGrid2D* g : {&state.layerBathymetry, &state.layerValues}) {
     *g = FloatGrid2D{};

@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "control/progress.h"
+#include "control/ranks.h"
 #include "control/run_driver.h"
 #include "input/cartography.h"
 #include "params/run_settings.h"
@@ -107,7 +108,9 @@ void runInitialise(RunState& state, const RunSettings& s) {
   local.nl = static_cast<std::int32_t>(nl);
   local.unitJ = local.unitK = local.unitL = 1;
   local.total = nj * nk * nl;
-  grid3DAlloc(local);
+  // Over several processes no process holds the whole result: its levels go
+  // from the process that holds them to the result file.
+  if (rankCount() == 1) grid3DAlloc(local);
 }
 
 }  // namespace karnet

@@ -9,6 +9,7 @@
 
 #include "control/log.h"
 #include "control/progress.h"
+#include "control/ranks.h"
 #include "interp/bilin.h"
 #include "interp/meanw.h"
 #include "interp/node_tests.h"
@@ -124,7 +125,9 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
     progressReport(done);
     done += spanK * spanJ;
     const std::int64_t lb = lOff + s;
-    if (lb < 0 || lb >= values.nl || lb >= bathymetry.nl || layerSize != values.layerSize() ||
+    // Only the levels this process holds (all of them when it runs alone).
+    if (lb < values.l0 || lb >= values.l0 + values.nl || lb < bathymetry.l0 ||
+        lb >= bathymetry.l0 + bathymetry.nl || layerSize != values.layerSize() ||
         layerSize != bathymetry.layerSize()) {
       continue;
     }
@@ -168,6 +171,10 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
     grid3DLayerPut(values, level, layerValues);
   }
 
+  // The counts of every process's levels.
+  std::int64_t sums[3] = {counts.bilinear, counts.weighted, counts.none};
+  ranksSum(sums, 3);
+  counts = InterpolationCounts{sums[0], sums[1], sums[2]};
   writeStatistics(counts);
   searchIndexFree(ws.index);
   grid2DFree(ws.scratch);

@@ -1,6 +1,8 @@
 #include "output/result_write.h"
 
+#include <algorithm>
 #include <string>
+#include <vector>
 
 #include "gridfile/grid_file.h"
 #include "gridfile/units.h"
@@ -46,8 +48,11 @@ int describeResult(GrdHeader* header, const FileDescription& d, std::int32_t ite
 
 }  // namespace
 
-int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
-                std::int32_t itemType, const FloatGrid3D& values, const char* projection,
+namespace {
+
+// Writes the file; with a level source, its levels in increasing order.
+int writeResult(const char* fileName, const FileDescription& description,
+                std::int32_t itemType, const ResultLevelSource* levels, const char* projection,
                 const TextAttributes* globalAttributes) {
   grdInitSystem();
   GrdHeader* header = nullptr;
@@ -61,14 +66,52 @@ int resultWrite(const char* fileName, const FileDescription& description, int wr
     grdHeaderDestroy(&header);
     return 0;
   }
-  if (writeValues != 0 && grdWriteItemTimeStep(header, file, 0.0, values.data) != 0) {
-    grdFileAbandon(header, &file);
-    grdHeaderDestroy(&header);
-    return 0;
+  if (levels != nullptr) {
+    const std::int64_t nx = description.axes[1].lastIndex + 1;
+    const std::int64_t ny = description.axes[2].lastIndex + 1;
+    const std::int32_t nz = description.axes[3].lastIndex + 1;
+    std::vector<float> buffer(static_cast<std::size_t>(nx * ny));
+    bool written = true;
+    for (std::int32_t s = 0; s < nz && written; ++s) {
+      written = (*levels)(s, buffer.data()) &&
+                grdWriteItemLevel(header, file, s, buffer.data()) == 0;
+    }
+    if (!written || grdFinishItemTimeStep(header, file, 0.0) != 0) {
+      grdFileAbandon(header, &file);
+      grdHeaderDestroy(&header);
+      return 0;
+    }
   }
   const int closed = grdFileClose(header, &file);
   grdHeaderDestroy(&header);
   return closed == 0 ? 1 : 0;
+}
+
+}  // namespace
+
+int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
+                std::int32_t itemType, const FloatGrid3D& values, const char* projection,
+                const TextAttributes* globalAttributes) {
+  if (writeValues == 0) {
+    return writeResult(fileName, description, itemType, nullptr, projection, globalAttributes);
+  }
+  // The values go level by level, as in a run over several processes, so that
+  // both give the same bytes.
+  const std::int64_t layer = values.layerSize();
+  const std::int64_t described = std::int64_t{description.axes[1].lastIndex + 1} *
+                                 (description.axes[2].lastIndex + 1);
+  const ResultLevelSource fromGrid = [&values, layer, described](std::int32_t s, float* buffer) {
+    if (values.data == nullptr || layer != described || s < 0 || s >= values.nl) return false;
+    std::copy(values.data + s * layer, values.data + (s + 1) * layer, buffer);
+    return true;
+  };
+  return writeResult(fileName, description, itemType, &fromGrid, projection, globalAttributes);
+}
+
+int resultWriteLevels(const char* fileName, const FileDescription& description,
+                      std::int32_t itemType, const ResultLevelSource& levels,
+                      const char* projection, const TextAttributes* globalAttributes) {
+  return writeResult(fileName, description, itemType, &levels, projection, globalAttributes);
 }
 
 }  // namespace karnet

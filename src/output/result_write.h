@@ -2,6 +2,7 @@
 #define KARNET_OUTPUT_RESULT_WRITE_H_
 
 #include <cstdint>
+#include <functional>
 
 #include "output/result_attributes.h"
 
@@ -22,6 +23,16 @@ struct FloatGrid3D;
 int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
                 std::int32_t itemType, const FloatGrid3D& values, const char* projection,
                 const TextAttributes* globalAttributes = nullptr);
+
+// Hands over local level s (0 for the first level of the result) of the
+// result grid: nx * ny floats, x fastest, into buffer; false when it cannot.
+using ResultLevelSource = std::function<bool(std::int32_t s, float* buffer)>;
+
+// The same file, its values taken level by level from `levels`, first level
+// first, so that the whole grid never needs to be in one place.
+int resultWriteLevels(const char* fileName, const FileDescription& description,
+                      std::int32_t itemType, const ResultLevelSource& levels,
+                      const char* projection, const TextAttributes* globalAttributes = nullptr);
 
 }  // namespace karnet
 

@@ -1,0 +1,147 @@
+// The processes of one run over MPI (or one plain process without it).
+#include "control/ranks.h"
+
+#include <cstdlib>
+#include <initializer_list>
+#include <limits>
+
+#ifdef KARNET_WITH_MPI
+// The C interface only, also when compiled as C++.
+#define OMPI_SKIP_MPICXX 1
+#define MPICH_SKIP_MPICXX 1
+#include <mpi.h>
+#endif
+
+namespace karnet {
+namespace {
+
+int ownRank = 0;
+int rankTotal = 1;
+bool joined = false;
+bool finished = false;
+bool endAgreed = false;
+
+}  // namespace
+
+bool ranksAvailable() {
+#ifdef KARNET_WITH_MPI
+  return true;
+#else
+  return false;
+#endif
+}
+
+bool ranksLaunched() {
+  // Open MPI's mpirun, PMIx launchers (srun --mpi=pmix, prterun) and the
+  // PMI-1/2 launchers each leave their mark in the environment.
+  for (const char* name : {"OMPI_COMM_WORLD_SIZE", "PMIX_RANK", "PMI_RANK", "PMI_SIZE"}) {
+    if (std::getenv(name) != nullptr) return true;
+  }
+  return false;
+}
+
+void ranksInit(int* argc, char*** argv) {
+#ifdef KARNET_WITH_MPI
+  // A plain run stays a plain process: MPI is started only under a launcher.
+  if (joined || !ranksLaunched()) return;
+  int provided = 0;
+  // Threads compute inside a rank; only the thread that drives the run calls MPI.
+  if (MPI_Init_thread(argc, argv, MPI_THREAD_FUNNELED, &provided) != MPI_SUCCESS) return;
+  joined = true;
+  MPI_Comm_rank(MPI_COMM_WORLD, &ownRank);
+  MPI_Comm_size(MPI_COMM_WORLD, &rankTotal);
+#else
+  (void)argc;
+  (void)argv;
+#endif
+}
+
+void ranksFinish() {
+#ifdef KARNET_WITH_MPI
+  if (!joined || finished) return;
+  finished = true;
+  MPI_Finalize();
+#endif
+}
+
+int rankIndex() { return ownRank; }
+int rankCount() { return rankTotal; }
+
+void ranksSum(std::int64_t* values, int count) {
+#ifdef KARNET_WITH_MPI
+  if (!joined || finished || rankTotal == 1 || count <= 0) return;
+  MPI_Allreduce(MPI_IN_PLACE, values, count, MPI_INT64_T, MPI_SUM, MPI_COMM_WORLD);
+#else
+  (void)values;
+  (void)count;
+#endif
+}
+
+#ifdef KARNET_WITH_MPI
+namespace {
+// Messages longer than an int can count go in pieces.
+constexpr std::size_t kPiece = std::size_t{1} << 30;
+}  // namespace
+#endif
+
+void ranksSendFloats(const float* data, std::size_t count, int to, int tag) {
+#ifdef KARNET_WITH_MPI
+  std::size_t done = 0;
+  do {
+    const std::size_t n = count - done < kPiece ? count - done : kPiece;
+    MPI_Send(data + done, static_cast<int>(n), MPI_FLOAT, to, tag, MPI_COMM_WORLD);
+    done += n;
+  } while (done < count);
+#else
+  (void)data;
+  (void)count;
+  (void)to;
+  (void)tag;
+#endif
+}
+
+void ranksReceiveFloats(float* data, std::size_t count, int from, int tag) {
+#ifdef KARNET_WITH_MPI
+  std::size_t done = 0;
+  do {
+    const std::size_t n = count - done < kPiece ? count - done : kPiece;
+    MPI_Recv(data + done, static_cast<int>(n), MPI_FLOAT, from, tag, MPI_COMM_WORLD,
+             MPI_STATUS_IGNORE);
+    done += n;
+  } while (done < count);
+#else
+  (void)data;
+  (void)count;
+  (void)from;
+  (void)tag;
+#endif
+}
+
+std::int32_t ranksAgreeOnEnd(std::int32_t ownCode) {
+#ifdef KARNET_WITH_MPI
+  if (joined && !finished && rankTotal > 1) {
+    // The lowest rank with a code speaks for all: its rank first, then its code.
+    int speaker = ownCode >= 0 ? ownRank : std::numeric_limits<int>::max();
+    MPI_Allreduce(MPI_IN_PLACE, &speaker, 1, MPI_INT, MPI_MIN, MPI_COMM_WORLD);
+    endAgreed = true;
+    if (speaker == std::numeric_limits<int>::max()) return -1;
+    std::int32_t code = ownCode;
+    MPI_Bcast(&code, 1, MPI_INT32_T, speaker, MPI_COMM_WORLD);
+    return code;
+  }
+#endif
+  return ownCode;
+}
+
+void ranksEnd() {
+  if (endAgreed || rankTotal == 1) ranksFinish();
+}
+
+void ranksAbort(std::int32_t exitCode) {
+#ifdef KARNET_WITH_MPI
+  if (joined && !finished) MPI_Abort(MPI_COMM_WORLD, exitCode);
+#endif
+  std::_Exit(exitCode);
+}
+
+}  // namespace karnet
