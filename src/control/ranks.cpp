@@ -5,6 +5,8 @@
 #include <initializer_list>
 #include <limits>
 
+#include <time.h>
+
 #ifdef KARNET_WITH_MPI
 // The C interface only, also when compiled as C++.
 #define OMPI_SKIP_MPICXX 1
@@ -20,6 +22,13 @@ int rankTotal = 1;
 bool joined = false;
 bool finished = false;
 bool endAgreed = false;
+#ifdef KARNET_WITH_MPI
+// The ending ranks meet here, apart from the run's own collectives, so that a
+// rank that ends early never meets one of those by mistake.
+MPI_Comm endComm = MPI_COMM_NULL;
+#endif
+// How long an ending rank waits for the others to end as well.
+constexpr double kEndWaitSeconds = 10.0;
 
 }  // namespace
 
@@ -50,6 +59,7 @@ void ranksInit(int* argc, char*** argv) {
   joined = true;
   MPI_Comm_rank(MPI_COMM_WORLD, &ownRank);
   MPI_Comm_size(MPI_COMM_WORLD, &rankTotal);
+  MPI_Comm_dup(MPI_COMM_WORLD, &endComm);
 #else
   (void)argc;
   (void)argv;
@@ -133,8 +143,31 @@ std::int32_t ranksAgreeOnEnd(std::int32_t ownCode) {
   return ownCode;
 }
 
-void ranksEnd() {
-  if (endAgreed || rankTotal == 1) ranksFinish();
+void ranksEnd(std::int32_t exitCode) {
+#ifdef KARNET_WITH_MPI
+  if (!joined || finished) return;
+  if (!endAgreed && rankTotal > 1) {
+    // Errors in the inputs reach every rank alike, and each ends by itself:
+    // when all of them end within the wait they leave the job together.
+    // Otherwise this rank leaves without the others, and the launcher ends
+    // the job.
+    int key = ownRank * 256 + (exitCode & 255);
+    int lowest = 0;
+    MPI_Request request = MPI_REQUEST_NULL;
+    MPI_Iallreduce(&key, &lowest, 1, MPI_INT, MPI_MIN, endComm, &request);
+    const double until = MPI_Wtime() + kEndWaitSeconds;
+    int done = 0;
+    while (MPI_Test(&request, &done, MPI_STATUS_IGNORE) == MPI_SUCCESS && done == 0 &&
+           MPI_Wtime() < until) {
+      struct timespec pause = {0, 1000000};
+      nanosleep(&pause, nullptr);
+    }
+    if (done == 0) return;
+  }
+  ranksFinish();
+#else
+  (void)exitCode;
+#endif
 }
 
 void ranksAbort(std::int32_t exitCode) {

@@ -39,11 +39,13 @@ void ranksReceiveFloats(float* data, std::size_t count, int from, int tag);
 // same point.
 std::int32_t ranksAgreeOnEnd(std::int32_t ownCode);
 
-// Leaves the job (MPI_Finalize) when every rank agreed on the end through
-// ranksAgreeOnEnd; otherwise leaves it as it is, so that the process's exit
-// makes the launcher end the job (a rank alone in MPI_Finalize would wait for
-// the others forever).
-void ranksEnd();
+// The last step of a rank that ends with the code: leaves the job
+// (MPI_Finalize) when every rank agreed on the end through ranksAgreeOnEnd,
+// or when all ranks end by themselves within a short wait (an error in the
+// inputs, which every rank meets). Otherwise it leaves the job as it is, so
+// that the process's exit makes the launcher end the others (a rank alone in
+// MPI_Finalize would wait for them forever).
+void ranksEnd(std::int32_t exitCode);
 
 // Ends every rank of the job at once with the code, from any one rank: for a
 // failure that the other ranks cannot know of.

@@ -43,7 +43,7 @@ void finishRun(std::int32_t exitCode, bool inSignal) {
   apvShutdown();
   // A run over several processes leaves its job together when all of them
   // agreed on the end; otherwise the launcher ends the others.
-  if (!inSignal) ranksEnd();
+  if (!inSignal) ranksEnd(exitCode);
 }
 
 // Logs the message and shows it to the user unless the environment says not to.
