@@ -19,6 +19,9 @@ int writeRankedResult(const RunInvocation& invocation, RunState& state,
   const std::int32_t nx = description.axes[1].lastIndex + 1;
   const std::int32_t ny = description.axes[2].lastIndex + 1;
   const std::int32_t nz = description.axes[3].lastIndex + 1;
+  // The analysis is done: the wet/dry field is not needed any more, and its
+  // room serves the result file that rank 0 builds.
+  grid3DFree(state.basicBathymetry);
   LevelGather gather(state, nx, ny, nz);
   if (!rankLeads()) {
     gather.sendHeld();

@@ -40,7 +40,15 @@ LevelRange shareBasicLevels(RunState& state, const RunSettings& s, std::int32_t 
   // A level also costs its copies and its smoothing, wet nodes or not.
   const std::int64_t perLevel = state.bathymetryGrid.elementCount() / 64 + 1;
   for (std::int64_t& w : work) w += perLevel;
-  state.levelOwners = partitionLevels(work, lOff, ranks);
+  // Rank 0 also builds the result file in memory: it takes the top block,
+  // where the levels are widest in water and so fewest for its share of the
+  // work, the next rank the block below, and so on down.
+  const auto levels = static_cast<std::int32_t>(work.size());
+  const std::vector<std::int64_t> topDown(work.rbegin(), work.rend());
+  state.levelOwners = partitionLevels(topDown, 0, ranks);
+  for (LevelRange& block : state.levelOwners) {
+    block.first = lOff + levels - block.first - block.count;
+  }
   return state.levelOwners[static_cast<std::size_t>(rank)];
 }
 
