@@ -1,8 +1,17 @@
 // Matrix inversion of the optimal interpolation: Gauss-Jordan elimination with
 // full pivoting, in place and in single precision.
+//
+// The row operations (pivot search, row exchange and scaling, elimination) are
+// written as plain loops over whole rows in which every element has its own
+// operations, in the order the method states them: vectorised, each element
+// still sees exactly the same single-precision operations, so every width gives
+// the same bits. The same body is compiled once per instruction set (AVX-512,
+// AVX2, the baseline); which one runs is decided once, from the processor.
 #include "analysis/invmtx.h"
 
+#include <bit>
 #include <cmath>
+#include <cstdint>
 
 namespace karnet {
 namespace {
@@ -10,9 +19,18 @@ namespace {
 // Scalings by ten that mark a determinant as too large.
 constexpr std::int32_t kTooLarge = 76;
 
-}  // namespace
+// Sort key of a matrix entry in the pivot search: the bits of its magnitude,
+// which order non-negative floats as the floats themselves, or -1 for a
+// not-a-number (which never wins the ">=" comparison). notFree is 0 for a free
+// column and -1 for a used one, which turns its key into -1.
+inline std::int32_t pivotKey(float value, std::int32_t notFree) {
+  std::int32_t magnitude = std::bit_cast<std::int32_t>(value) & 0x7fffffff;
+  magnitude = magnitude > 0x7f800000 ? -1 : magnitude;
+  return magnitude | notFree;
+}
 
-std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
+[[gnu::always_inline]] inline std::int32_t invert(OaWorkspace& ws, float* a, std::int32_t n,
+                                                  float& det) {
   if (n < 1) {
     ws.errorText = "NOBS < 1 in INVMTX";
     return -1;
@@ -22,46 +40,49 @@ std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
     return -1;
   }
   const std::int64_t stride = ws.limit;
-  auto at = [a, stride](std::int32_t r, std::int32_t q) -> float& { return a[r * stride + q]; };
+  auto rowOf = [a, stride](std::int32_t r) { return a + r * stride; };
 
   // used[c] is -1 while column c has not been a pivot column, else the row its
   // pivot was found in; order[s] is the pivot column of step s.
-  std::int32_t* used = ws.pivot;
-  std::int32_t* order = ws.pivot + n;
+  std::int32_t* __restrict used = ws.pivot;
+  std::int32_t* __restrict order = ws.pivot + n;
   for (std::int32_t i = 0; i < 2 * n; ++i) ws.pivot[i] = -1;
   det = 1.0f;
   std::int32_t scale = 0;
 
   // The indices not yet used as pivots, ascending; a free column is also a
   // free row, as each pivot is moved onto the diagonal.
-  std::int32_t* free = ws.pivot + 2 * std::int64_t{n};
+  std::int32_t* __restrict free = ws.pivot + 2 * std::int64_t{n};
   std::int32_t freeCount = n;
   for (std::int32_t i = 0; i < n; ++i) free[i] = i;
 
   for (std::int32_t s = 0; s < n; ++s) {
-    // Pivot search. The scan runs over columns (outer) and rows (inner) of the
-    // free entries and takes the entry of greatest magnitude, ">=" letting the
+    // Pivot search. The method scans the free entries over columns (outer) and
+    // rows (inner) and takes the entry of greatest magnitude, ">=" letting the
     // last of equal magnitudes win: that is the equal-magnitude entry with the
-    // greatest column, and within it the greatest row. Here the free entries
-    // are visited row by row, along memory, with that tie rule made explicit.
-    // A not-a-number never wins; should every free entry be one, the first
-    // free column and row stand as the pivot.
+    // greatest column, and within it the greatest row. Here each free row's
+    // greatest key is found over the whole row (used columns masked out), and
+    // only a row that reaches the running maximum is looked at for its last
+    // column holding it. A not-a-number never wins; should every free entry be
+    // one, the first free column and row stand as the pivot.
     std::int32_t pivotRow = free[0];
     std::int32_t pivotCol = free[0];
-    float largest = 0.0f;
-    bool found = false;
+    std::int32_t best = -1;
     for (std::int32_t ri = 0; ri < freeCount; ++ri) {
       const std::int32_t r = free[ri];
-      const float* row = &at(r, 0);
-      for (std::int32_t ci = 0; ci < freeCount; ++ci) {
-        const std::int32_t b = free[ci];
-        const float magnitude = std::fabs(row[b]);
-        if (magnitude > largest || (magnitude == largest && (!found || b >= pivotCol))) {
-          largest = magnitude;
-          pivotRow = r;
-          pivotCol = b;
-          found = true;
-        }
+      const float* __restrict row = rowOf(r);
+      std::int32_t rowBest = -1;
+      for (std::int32_t q = 0; q < n; ++q) {
+        const std::int32_t key = pivotKey(row[q], ~used[q] >> 31);
+        rowBest = key > rowBest ? key : rowBest;
+      }
+      if (rowBest < best || rowBest < 0) continue;
+      std::int32_t col = n - 1;
+      while (pivotKey(row[col], ~used[col] >> 31) != rowBest) --col;
+      if (rowBest > best || col >= pivotCol) {
+        best = rowBest;
+        pivotRow = r;
+        pivotCol = col;
       }
     }
     const std::int32_t pr = pivotRow;
@@ -73,7 +94,7 @@ std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
       if (free[i] != pc) free[kept++] = free[i];
     }
     freeCount = kept;
-    const float p = at(pr, pc);
+    const float p = rowOf(pr)[pc];
 
     det = det * p;
     while (std::fabs(det) > 1.0f) {
@@ -93,23 +114,34 @@ std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
       return -1;
     }
 
-    at(pr, pc) = 1.0f;
+    // The pivot entry becomes 1 before the exchange, and each eliminated row's
+    // entry in column pc becomes 0 before its update. Both are folded into the
+    // row loops as a choice per element (the same values in the same
+    // operations): a single-element store right before a loop that reads the
+    // row as vectors would stall the load.
     // Exchange rows pr and pc; the row that lands in pc is divided by p.
-    float* rowA = &at(pr, 0);
-    float* rowB = &at(pc, 0);
-    for (std::int32_t q = 0; q < n; ++q) {
-      const float t = rowA[q];
-      rowA[q] = rowB[q];
-      rowB[q] = t / p;
+    float* rowB = rowOf(pc);
+    if (pr == pc) {
+      for (std::int32_t q = 0; q < n; ++q) rowB[q] = (q == pc ? 1.0f : rowB[q]) / p;
+    } else {
+      float* __restrict rowA = rowOf(pr);
+      float* __restrict target = rowB;
+      for (std::int32_t q = 0; q < n; ++q) {
+        const float t = q == pc ? 1.0f : rowA[q];
+        rowA[q] = target[q];
+        target[q] = t / p;
+      }
     }
 
     // Elimination of column pc from every other row.
+    const float* __restrict pivotRowValues = rowB;
     for (std::int32_t r = 0; r < n; ++r) {
       if (r == pc) continue;
-      float* row = &at(r, 0);
+      float* __restrict row = rowOf(r);
       const float f = row[pc];
-      row[pc] = 0.0f;
-      for (std::int32_t q = 0; q < n; ++q) row[q] = row[q] - f * rowB[q];
+      for (std::int32_t q = 0; q < n; ++q) {
+        row[q] = (q == pc ? 0.0f : row[q]) - f * pivotRowValues[q];
+      }
     }
   }
 
@@ -120,7 +152,7 @@ std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
     if (r == b) continue;
     det = static_cast<float>(static_cast<double>(det) * -1.0);
     for (std::int32_t q = 0; q < n; ++q) {
-      float* row = &at(q, 0);
+      float* row = rowOf(q);
       const float t = row[r];
       row[r] = row[b];
       row[b] = t;
@@ -132,9 +164,108 @@ std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
     det = static_cast<float>(scale);
     return -1;
   }
-  det = static_cast<float>(static_cast<double>(det) * std::pow(10.0, scale));
+  // pow(10, 0) is exactly 1 by definition; the usual unscaled determinant
+  // spares the call.
+  const double power = scale == 0 ? 1.0 : std::pow(10.0, scale);
+  det = static_cast<float>(static_cast<double>(det) * power);
   if (static_cast<double>(det) < 1e-4) ws.errorText = "Determinant very small in INVMTX";
   return 0;
+}
+
+std::int32_t invertBaseline(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
+  return invert(ws, a, n, det);
+}
+
+#if defined(__x86_64__) && defined(__GNUC__)
+#define KARNET_INVMTX_CLONES 1
+[[gnu::target("avx2")]] std::int32_t invertAvx2(OaWorkspace& ws, float* a, std::int32_t n,
+                                                float& det) {
+  return invert(ws, a, n, det);
+}
+
+[[gnu::target("avx512f,avx512bw,avx512vl,prefer-vector-width=512")]] std::int32_t invertAvx512(
+    OaWorkspace& ws, float* a, std::int32_t n, float& det) {
+  return invert(ws, a, n, det);
+}
+#endif
+
+using InvertFunction = std::int32_t (*)(OaWorkspace&, float*, std::int32_t, float&);
+
+InvertFunction variantFunction(InvmtxVariant variant) {
+  if (!invmtxVariantAvailable(variant)) return nullptr;
+  switch (variant) {
+    case InvmtxVariant::kBaseline:
+      return invertBaseline;
+#ifdef KARNET_INVMTX_CLONES
+    case InvmtxVariant::kAvx2:
+      return invertAvx2;
+    case InvmtxVariant::kAvx512:
+      return invertAvx512;
+#endif
+    default:
+      return nullptr;
+  }
+}
+
+// The variant for blocks of up to kShortRows rows, and the one for larger
+// blocks. 512-bit rows only pay once they are long: on short ones the partial
+// vector at the end of each row costs more than the wider body saves.
+constexpr std::int32_t kShortRows = 32;
+
+struct Chosen {
+  InvertFunction shortRows = invertBaseline;
+  InvertFunction longRows = invertBaseline;
+};
+
+Chosen chooseVariants() {
+  Chosen chosen;
+  if (InvertFunction f = variantFunction(InvmtxVariant::kAvx2)) {
+    chosen.shortRows = f;
+    chosen.longRows = f;
+  }
+  if (InvertFunction f = variantFunction(InvmtxVariant::kAvx512)) chosen.longRows = f;
+  return chosen;
+}
+
+}  // namespace
+
+bool invmtxVariantAvailable(InvmtxVariant variant) {
+  switch (variant) {
+    case InvmtxVariant::kBaseline:
+      return true;
+#ifdef KARNET_INVMTX_CLONES
+    case InvmtxVariant::kAvx2:
+      return __builtin_cpu_supports("avx2");
+    case InvmtxVariant::kAvx512:
+      return __builtin_cpu_supports("avx512f") && __builtin_cpu_supports("avx512bw") &&
+             __builtin_cpu_supports("avx512vl");
+#endif
+    default:
+      return false;
+  }
+}
+
+const char* invmtxVariantName(InvmtxVariant variant) {
+  switch (variant) {
+    case InvmtxVariant::kBaseline:
+      return "baseline";
+    case InvmtxVariant::kAvx2:
+      return "avx2";
+    case InvmtxVariant::kAvx512:
+      return "avx512";
+  }
+  return "?";
+}
+
+std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
+  static const Chosen chosen = chooseVariants();
+  return (n > kShortRows ? chosen.longRows : chosen.shortRows)(ws, a, n, det);
+}
+
+std::int32_t invmtxWith(InvmtxVariant variant, OaWorkspace& ws, float* a, std::int32_t n,
+                        float& det) {
+  const InvertFunction f = variantFunction(variant);
+  return f != nullptr ? f(ws, a, n, det) : invertBaseline(ws, a, n, det);
 }
 
 }  // namespace karnet

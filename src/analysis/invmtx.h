@@ -19,7 +19,22 @@ namespace karnet {
 // success. det receives the determinant. The pivot records live in ws.pivot: entry c
 // is the row in which column c's pivot was found, entry n + s the pivot column
 // of step s.
+// Runs the compiled variant that suits n best among those the processor supports.
 std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det);
+
+// The compiled variants of INVMTX, one per instruction set; all give the same
+// bits. kBaseline runs everywhere.
+enum class InvmtxVariant { kBaseline, kAvx2, kAvx512 };
+inline constexpr InvmtxVariant kInvmtxVariants[] = {InvmtxVariant::kBaseline,
+                                                    InvmtxVariant::kAvx2, InvmtxVariant::kAvx512};
+
+// Whether this build holds the variant and the processor can run it.
+bool invmtxVariantAvailable(InvmtxVariant variant);
+const char* invmtxVariantName(InvmtxVariant variant);
+
+// INVMTX through the given variant (the baseline when it is not available).
+std::int32_t invmtxWith(InvmtxVariant variant, OaWorkspace& ws, float* a, std::int32_t n,
+                        float& det);
 
 }  // namespace karnet
 

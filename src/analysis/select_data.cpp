@@ -2,6 +2,7 @@
 #include "analysis/select_data.h"
 
 #include <algorithm>
+#include <bit>
 #include <cmath>
 
 #include "analysis/correlation.h"
@@ -34,6 +35,24 @@ std::int64_t reachInNodes(float r2) {
   return o;
 }
 
+// rowReach[o] for o = 0 .. count - 1: the largest row offset d for which a
+// cell o columns and d rows from the node passes the radius test, whose float
+// arithmetic (whole-node offsets, exact squares) rises with d; -1 when none
+// does. The radius is bounded here (reachInNodes is below kUnbounded), so
+// every offset stays exact as a float.
+void fillRowReach(std::int32_t* rowReach, std::int64_t count, float r2) {
+  auto passes = [r2](std::int64_t o, std::int64_t d) {
+    const auto fo = static_cast<float>(o);
+    const auto fd = static_cast<float>(d);
+    return !(fd * fd + fo * fo > r2);
+  };
+  std::int64_t d = reachInNodes(r2);
+  for (std::int64_t o = 0; o < count; ++o) {
+    while (d >= 0 && !passes(o, d)) --d;
+    rowReach[o] = static_cast<std::int32_t>(d);
+  }
+}
+
 // Appends data cell i as a candidate of node (nodeX, nodeY) when it lies within
 // the search radius.
 inline void consider(OaWorkspace& ws, std::int32_t i, float nodeX, float nodeY, float radius2,
@@ -45,6 +64,37 @@ inline void consider(OaWorkspace& ws, std::int32_t i, float nodeX, float nodeY, 
   ws.candIndex[count] = i;
   ws.candCorr[count] = tabledCorrelation(d2, ws);
   ++count;
+}
+
+// The exchange sort of sortByCorrelation on one array of 64-bit keys instead
+// of two arrays: the high half is an integer image of the correlation that
+// orders as the floats do (both zeros alike), the low half the candidate's
+// position, which the comparisons leave out. The same comparisons in the same
+// order make the same moves. Returns false, sorting nothing, when a
+// correlation is not a number (which no integer image orders like a float).
+bool sortByKey(OaWorkspace& ws, std::int32_t n) {
+  std::uint64_t* key = ws.candKey;
+  for (std::int32_t i = 0; i < n; ++i) {
+    const float c = ws.candCorr[i];
+    if (c != c) return false;
+    const auto bits = std::bit_cast<std::uint32_t>(c == 0.0f ? 0.0f : c);
+    const std::uint32_t image = bits & 0x80000000u ? ~bits : bits | 0x80000000u;
+    key[i] = (std::uint64_t{image} << 32) | static_cast<std::uint32_t>(i);
+  }
+  constexpr std::uint64_t kHigh = 0xffffffff00000000u;
+  for (std::int32_t gap = n / 2; gap >= 1; gap /= 2) {
+    for (std::int32_t i = gap; i < n; ++i) {
+      const std::uint64_t moving = key[i];
+      const std::uint64_t bound = moving & kHigh;  // below it: a smaller correlation
+      std::int32_t p = i;
+      while (p >= gap && key[p - gap] < bound) {
+        key[p] = key[p - gap];
+        p -= gap;
+      }
+      key[p] = moving;
+    }
+  }
+  return true;
 }
 
 }  // namespace
@@ -88,23 +138,48 @@ std::int32_t selectData(OaWorkspace& ws, std::int32_t j, std::int32_t k,
     // rows, that the radius can reach are visited, in collection order. Cells
     // outside that window would fail the radius test anyway.
     const std::int32_t nj = ws.columnCount;
-    const std::int64_t reach = reachInNodes(radius2);
+    const bool sameRadius = ws.rowReachCount != 0 && ws.rowReachRadius2 == radius2;
+    const std::int64_t reach = sameRadius ? ws.rowReachNodes : reachInNodes(radius2);
     const std::int64_t xFirst = std::max<std::int64_t>(std::int64_t{j} - reach, 0);
     const std::int64_t xLast = std::min<std::int64_t>(std::int64_t{j} + reach, nj - 1);
-    const bool windowY = reach < kUnbounded;
-    const double yFirst = static_cast<double>(std::int64_t{k} - reach);
-    const double yLast = static_cast<double>(std::int64_t{k} + reach);
-    for (std::int64_t x = xFirst; x <= xLast; ++x) {
-      std::int32_t i = ws.columnStart[x];
-      const std::int32_t end = ws.columnStart[x + 1];
-      if (windowY) {
-        const float* first = std::lower_bound(
-            ws.dataY + i, ws.dataY + end, yFirst,
-            [](float y, double bound) { return static_cast<double>(y) < bound; });
-        i = static_cast<std::int32_t>(first - ws.dataY);
+    if (reach >= kUnbounded) {
+      for (std::int64_t x = xFirst; x <= xLast; ++x) {
+        for (std::int32_t i = ws.columnStart[x]; i < ws.columnStart[x + 1]; ++i) {
+          consider(ws, i, nodeX, nodeY, radius2, count);
+        }
       }
-      for (; i < end && !(windowY && static_cast<double>(ws.dataY[i]) > yLast); ++i) {
-        consider(ws, i, nodeX, nodeY, radius2, count);
+    } else if (xFirst <= xLast) {
+      std::int32_t* rowReach = ws.rowReach;
+      if (!sameRadius) {
+        const std::int64_t offsets = std::min<std::int64_t>(reach + 1, nj);
+        fillRowReach(rowReach, offsets, radius2);
+        ws.rowReachCount = static_cast<std::int32_t>(offsets);
+        ws.rowReachRadius2 = radius2;
+        ws.rowReachNodes = reach;
+      }
+      // The cursors stand at each column's first cell at or above the window
+      // of an earlier node of this column (same radius, so the same columns);
+      // a later node's window starts no lower, so they only move up.
+      const bool resume = sameRadius && ws.cursorJ == j && ws.cursorK <= k;
+      ws.cursorJ = j;
+      ws.cursorK = k;
+      for (std::int64_t x = xFirst; x <= xLast; ++x) {
+        const std::int64_t rows = rowReach[x < j ? j - x : x - j];
+        const double yFirst = static_cast<double>(std::int64_t{k} - rows);
+        const double yLast = static_cast<double>(std::int64_t{k} + rows);
+        const std::int32_t end = ws.columnStart[x + 1];
+        std::int32_t i = ws.columnCursor[x];
+        if (!resume) {
+          const float* first = std::lower_bound(
+              ws.dataY + ws.columnStart[x], ws.dataY + end, yFirst,
+              [](float y, double bound) { return static_cast<double>(y) < bound; });
+          i = static_cast<std::int32_t>(first - ws.dataY);
+        }
+        while (i < end && static_cast<double>(ws.dataY[i]) < yFirst) ++i;
+        ws.columnCursor[x] = i;
+        for (; i < end && !(static_cast<double>(ws.dataY[i]) > yLast); ++i) {
+          consider(ws, i, nodeX, nodeY, radius2, count);
+        }
       }
     }
   } else {
@@ -115,8 +190,21 @@ std::int32_t selectData(OaWorkspace& ws, std::int32_t j, std::int32_t k,
 
   std::int32_t kept = count;
   if (count > ws.limit) {
-    sortByCorrelation(ws.candCorr, ws.candIndex, count);
     kept = ws.limit > 0 ? ws.limit : 0;
+    if (sortByKey(ws, count)) {
+      // Candidate p of the sorted order is the one first found at position
+      // candKey[p]'s low half.
+      for (std::int32_t p = 0; p < kept; ++p) {
+        const auto from = static_cast<std::int32_t>(ws.candKey[p] & 0xffffffffu);
+        const std::int32_t i = ws.candIndex[from];
+        ws.selX[p] = ws.dataX[i];
+        ws.selY[p] = ws.dataY[i];
+        ws.selValue[p] = ws.dataValue[i];
+        ws.selCorr[p] = ws.candCorr[from];
+      }
+      return kept;
+    }
+    sortByCorrelation(ws.candCorr, ws.candIndex, count);
   }
   for (std::int32_t p = 0; p < kept; ++p) {
     const std::int32_t i = ws.candIndex[p];

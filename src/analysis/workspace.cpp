@@ -61,6 +61,7 @@ void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::i
   ws.dataValue = allocateEntries<float>(data);
   ws.candIndex = allocateEntries<std::int32_t>(data);
   ws.candCorr = allocateEntries<float>(data);
+  ws.candKey = allocateEntries<std::uint64_t>(data);
 
   ws.selX = allocateEntries<float>(limit);
   ws.selY = allocateEntries<float>(limit);
@@ -85,12 +86,20 @@ void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::i
 
   ws.columnCount = 0;
   ws.columnStart = nullptr;
+  ws.columnCursor = nullptr;
+  ws.cursorJ = -1;
+  ws.rowReach = nullptr;
+  ws.rowReachCount = 0;
   ws.errorText = "";
 }
 
 void workspaceIndexColumns(OaWorkspace& ws, std::int32_t nj) {
   release(ws.columnStart);
+  release(ws.columnCursor);
+  release(ws.rowReach);
   ws.columnCount = 0;
+  ws.cursorJ = -1;
+  ws.rowReachCount = 0;
   // Positions must stay exact as floats for the column window of the selection.
   if (nj < 1 || nj >= (1 << 24)) return;
 
@@ -114,6 +123,8 @@ void workspaceIndexColumns(OaWorkspace& ws, std::int32_t nj) {
     while (i < ws.dataCount && ws.dataX[i] == static_cast<float>(x)) ++i;
   }
   ws.columnStart[nj] = i;
+  ws.columnCursor = allocateEntries<std::int32_t>(nj);
+  ws.rowReach = allocateEntries<std::int32_t>(nj);
   ws.columnCount = nj;
 }
 
@@ -123,6 +134,7 @@ void workspaceRelease(OaWorkspace& ws) {
   release(ws.dataValue);
   release(ws.candIndex);
   release(ws.candCorr);
+  release(ws.candKey);
   release(ws.selX);
   release(ws.selY);
   release(ws.selValue);
@@ -132,6 +144,10 @@ void workspaceRelease(OaWorkspace& ws) {
   release(ws.pivot);
   release(ws.corrTable);
   release(ws.columnStart);
+  release(ws.columnCursor);
+  release(ws.rowReach);
+  ws.cursorJ = -1;
+  ws.rowReachCount = 0;
   ws.dataCapacity = 0;
   ws.dataCount = 0;
   ws.lineCapacity = 0;

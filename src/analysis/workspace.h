@@ -29,6 +29,9 @@ struct OaWorkspace {
   // Candidates of the node being estimated and their correlation with it.
   std::int32_t* candIndex = nullptr;
   float* candCorr = nullptr;
+  // Sort keys of the candidates (an integer image of the correlation above the
+  // candidate's position), one entry per data cell.
+  std::uint64_t* candKey = nullptr;
 
   // The cells chosen for the node (limit entries each).
   float* selX = nullptr;
@@ -59,6 +62,24 @@ struct OaWorkspace {
   // cells are in any other order; the selection then scans every cell.
   std::int32_t columnCount = 0;
   std::int32_t* columnStart = nullptr;
+
+  // Where the selection's window of each column began at the latest node, so
+  // that the next node of the same column (the layer pass's order: k rising
+  // within a column j) moves each start forward instead of searching it
+  // again. Valid for node column cursorJ and rows from cursorK on; any other
+  // node starts afresh. columnCount entries, with the column index.
+  std::int32_t* columnCursor = nullptr;
+  std::int32_t cursorJ = -1;
+  std::int32_t cursorK = 0;
+
+  // rowReach[o] is the largest row offset whose cell, o columns from the node,
+  // passes the search radius test (the test's own float arithmetic), for
+  // o = 0 .. rowReachCount - 1; made for the squared radius rowReachRadius2,
+  // whose reach in whole nodes (along one axis) is rowReachNodes.
+  std::int32_t rowReachCount = 0;
+  float rowReachRadius2 = 0;
+  std::int64_t rowReachNodes = 0;
+  std::int32_t* rowReach = nullptr;
 
   // Reason of the latest estimator failure (or its warning); never printed.
   const char* errorText = "";

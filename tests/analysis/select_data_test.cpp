@@ -156,6 +156,95 @@ TEST(SelectData, ColumnWindowMatchesTheFullScan) {
   }
 }
 
+// The selection as the method states it: every cell in collection order, the
+// radius test, the correlation model evaluated directly, and when there are
+// more candidates than the limit the pass-by-pass sort of all of them.
+std::vector<std::array<float, 4>> literalSelection(const OaWorkspace& ws,
+                                                   const std::vector<std::array<float, 3>>& cells,
+                                                   std::int32_t j, std::int32_t k,
+                                                   const RunSettings& s) {
+  const float r2 = s.SearchRadius * s.SearchRadius / s.dx / s.dx;
+  std::vector<float> corr;
+  std::vector<std::int32_t> index;
+  for (std::size_t i = 0; i < cells.size(); ++i) {
+    const float dy = static_cast<float>(k) - cells[i][1];
+    const float dx = static_cast<float>(j) - cells[i][0];
+    const float d2 = dy * dy + dx * dx;
+    if (d2 > r2) continue;
+    corr.push_back(correlation(d2, ws));
+    index.push_back(static_cast<std::int32_t>(i));
+  }
+  if (static_cast<std::int32_t>(corr.size()) > ws.limit) {
+    passByPassSort(corr, index);
+    corr.resize(static_cast<std::size_t>(ws.limit));
+    index.resize(corr.size());
+  }
+  std::vector<std::array<float, 4>> chosen;
+  for (std::size_t p = 0; p < corr.size(); ++p) {
+    const auto& c = cells[static_cast<std::size_t>(index[p])];
+    chosen.push_back({c[0], c[1], c[2], corr[p]});
+  }
+  return chosen;
+}
+
+TEST(SelectData, EveryVisitingOrderMatchesTheLiteralSelection) {
+  // Random layers, sparse to nearly full, with values from a few levels (ties
+  // in correlation abound at the cut): the indexed selection, whose column
+  // cursors carry over from node to node, must choose the very cells of the
+  // literal steps in the very order, whichever order the nodes come in.
+  constexpr unsigned kDensity[] = {4, 30, 90};  // per cent of the nodes
+  constexpr std::int32_t kLimit[] = {1, 5, 20, 3};
+  constexpr float kSpacing[] = {1.0f, 2.5f};
+  constexpr float kRadius[] = {0.0f, 1.0f, 2.5f, 7.3f, 12.0f, 1000.0f};  // in nodes
+  std::mt19937 random(23);
+  int compared = 0, cut = 0;
+  for (int trial = 0; trial < 36; ++trial) {
+    const std::int32_t nj = 12 + static_cast<std::int32_t>(random() % 20);
+    const std::int32_t nk = 12 + static_cast<std::int32_t>(random() % 20);
+    const unsigned density = kDensity[trial % 3];
+    std::vector<std::array<float, 3>> cells;
+    for (std::int32_t j = 0; j < nj; ++j) {
+      for (std::int32_t k = 0; k < nk; ++k) {
+        if (random() % 100 < density)
+          cells.push_back({float(j), float(k), static_cast<float>(random() % 7) * 0.5f});
+      }
+    }
+    RunSettings s = testing::withLimit(kLimit[trial % 4]);
+    s.dx = kSpacing[trial % 2];
+    s.SearchRadius = s.dx * kRadius[trial % 6];
+    s.DecayDistance = 3.0f * s.dx;
+    s.ZeroCrossingDistance = trial % 9 == 4 ? 0.0f : 8.0f * s.dx;  // 0: not-a-number at d2 0
+    const auto n = static_cast<std::int32_t>(cells.size());
+    ScopedWorkspace w(n, nj, nk, s);
+    w.setCells(cells);
+    workspaceIndexColumns(w.ws, nj);
+    ASSERT_NE(w.ws.columnStart, nullptr);
+
+    std::vector<std::pair<std::int32_t, std::int32_t>> nodes;
+    for (std::int32_t j = 0; j < nj; ++j)  // the layer pass's order
+      for (std::int32_t k = 0; k < nk; ++k) nodes.emplace_back(j, k);
+    for (std::int32_t k = 0; k < nk; ++k)  // row by row
+      for (std::int32_t j = 0; j < nj; ++j) nodes.emplace_back(j, k);
+    for (int i = 0; i < 100; ++i)  // anywhere, rows going down as well
+      nodes.emplace_back(random() % nj, random() % nk);
+    for (const auto& [j, k] : nodes) {
+      const std::int32_t m = selectData(w.ws, j, k, s);
+      const auto expected = literalSelection(w.ws, cells, j, k, s);
+      ASSERT_EQ(m, static_cast<std::int32_t>(expected.size()))
+          << "trial " << trial << " node " << j << "," << k;
+      for (std::int32_t p = 0; p < m; ++p) {
+        const std::array<float, 4> got = {w.ws.selX[p], w.ws.selY[p], w.ws.selValue[p],
+                                          w.ws.selCorr[p]};
+        ASSERT_EQ(std::memcmp(got.data(), expected[p].data(), sizeof got), 0)
+            << "trial " << trial << " node " << j << "," << k << " cell " << p;
+      }
+      ++compared;
+      cut += m == s.CorrelationSampleSize ? 1 : 0;
+    }
+  }
+  EXPECT_GT(cut, compared / 4);  // the cut at the limit is well exercised
+}
+
 TEST(Objan, OneChosenCellGivesItsOwnValueAndNoneFails) {
   const RunSettings s = testing::withLimit(4);
   ScopedWorkspace w(1, 30, 30, s);
