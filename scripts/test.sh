@@ -2,7 +2,9 @@
 # Installs what is missing, builds karnet with its tests and runs every test; then builds the
 # tests again with AddressSanitizer and UndefinedBehaviorSanitizer (in build-sanitize/) and
 # runs them there too. Exit status 0 only when both pass.
+# Last, each libFuzzer harness runs for 30 seconds (scripts/fuzz.sh, in build-fuzz/).
 #   KARNET_NO_SANITIZE=1 scripts/test.sh   skips the sanitizer build.
+#   KARNET_NO_FUZZ=1 scripts/test.sh       skips the fuzzing.
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
@@ -20,5 +22,8 @@ if [ "${KARNET_NO_SANITIZE:-0}" != "1" ]; then
   # there would only replace the exit codes that the tests check.
   (cd build-sanitize && ASAN_OPTIONS=detect_leaks=0 \
      UBSAN_OPTIONS=print_stacktrace=1:halt_on_error=1 ctest --output-on-failure -j "$jobs")
+fi
+if [ "${KARNET_NO_FUZZ:-0}" != "1" ]; then
+  ./scripts/fuzz.sh 30
 fi
 echo "test.sh: all tests passed"

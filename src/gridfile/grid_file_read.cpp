@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <cfloat>
 #include <cmath>
+#include <cstdio>
 #include <cstring>
 #include <memory>
 #include <set>
@@ -13,6 +14,7 @@
 #include <string>
 #include <vector>
 
+#include "gridfile/classic_header.h"
 #include "gridfile/grid_file.h"
 #include "gridfile/grid_file_internal.h"
 
@@ -366,6 +368,16 @@ int grdFileRead(const char* fileName, GrdHeader** header, GrdFile** file) {
   if (fileName == nullptr || fileName[0] == '\0') return 1;
   struct stat info;
   if (stat(fileName, &info) != 0 || !S_ISREG(info.st_mode)) return 1;
+  // A classic-format header that declares more than the file holds would make
+  // the NetCDF library allocate and convert the declared sizes first.
+  if (std::FILE* stream = std::fopen(fileName, "rb")) {
+    const ClassicHeader header =
+        checkClassicHeader(stream, static_cast<std::uint64_t>(info.st_size));
+    std::fclose(stream);
+    if (header == ClassicHeader::kBroken) return 1;
+  } else {
+    return 1;
+  }
   // A relative name goes to NetCDF as a path, never as a remote (URL) address.
   std::string path = fileName;
   if (path[0] != '/') path = "./" + path;

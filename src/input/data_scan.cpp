@@ -16,9 +16,11 @@
 #include "input/bathymetry_read.h"
 #include "input/cartography.h"
 #include "input/level_share.h"
+#include "input/observation_line.h"
 #include "params/run_settings.h"
 #include "state/run_state.h"
 #include "support/file_description.h"
+#include "support/memory_limit.h"
 
 namespace karnet {
 namespace {
@@ -69,37 +71,6 @@ void bathymetryExtents(const FileDescription& d, const Rotation& r, Extent& x, E
   }
 }
 
-// Parses "x y z value": four finite numbers separated by white space; anything
-// after the fourth is ignored. False for fewer or non-finite numbers.
-bool parseObservation(const char* line, double out[4]) {
-  const char* p = line;
-  for (int n = 0; n < 4; ++n) {
-    char* end = nullptr;
-    errno = 0;
-    const double v = std::strtod(p, &end);
-    if (end == p || !std::isfinite(v)) return false;
-    out[n] = v;
-    p = end;
-  }
-  return true;
-}
-
-// Reads one line of any length into text, without its line feed. False at end of file.
-bool readLine(std::FILE* file, std::string& text) {
-  text.clear();
-  char buffer[4096];
-  bool any = false;
-  while (std::fgets(buffer, sizeof buffer, file) != nullptr) {
-    any = true;
-    text += buffer;
-    if (!text.empty() && text.back() == '\n') {
-      text.pop_back();
-      return true;
-    }
-  }
-  return any;
-}
-
 // The log keeps its fixed lines; the user also sees the file, the line and why.
 [[noreturn]] void waterFileError(RunState& state, const char* fileName, std::int64_t lineNumber,
                                  const std::string& reason) {
@@ -121,10 +92,13 @@ std::int64_t readObservations(RunState& state, const char* fileName, const Rotat
   std::string line;
   std::int64_t stored = 0;
   std::int64_t lineNumber = 0;
-  while (readLine(file, line)) {
+  for (;;) {
+    const LineRead got = readObservationLine(file, line);
+    if (got == LineRead::kEnd) break;
     ++lineNumber;
     if (stored % 1000 == 0) progressCheckCancel();
     double v[4];
+    if (got == LineRead::kNulByte) waterFileError(state, fileName, lineNumber, "holds a NUL byte");
     if (!parseObservation(line.c_str(), v)) {
       const std::string problem = observationLineProblem(line.c_str());
       waterFileError(state, fileName, lineNumber, problem.empty() ? "cannot be read" : problem);
@@ -283,6 +257,22 @@ void dataScan(RunState& state, const RunSettings& s, const char* bathymetryFile,
                         ax.count * ay.count > kMaxCount ||
                         ax.count * ay.count * az.count > kMaxCount;
   if (tooLarge) stopScan(state, "\nERROR: basic grid too large\n");
+  // The four basic-grid fields come on top of what is already held; a request
+  // that cannot be met stops here, before anything is allocated.
+  const std::uint64_t layer = byteSize(static_cast<std::uint64_t>(ax.count * ay.count), 4);
+  const std::uint64_t volume = byteSize(layer, static_cast<std::uint64_t>(az.count));
+  const std::uint64_t held = byteSize(static_cast<std::uint64_t>(state.localValues.total), 4) +
+                             byteSize(static_cast<std::uint64_t>(state.scatter.capacity), 32);
+  const std::uint64_t needed = 2 * volume + 2 * layer + held;
+  const std::uint64_t limit = memoryLimitBytes();
+  if (needed > limit) {
+    logPrintf("\nBasic grid of %lld x %lld x %lld nodes needs %llu bytes with the result grid"
+              " and the observations; at most %llu bytes of memory are available\n",
+              static_cast<long long>(ax.count), static_cast<long long>(ay.count),
+              static_cast<long long>(az.count), static_cast<unsigned long long>(needed),
+              static_cast<unsigned long long>(limit));
+    stopScan(state, "\nUnable to allocate memory \n");
+  }
 
   *lastObs = static_cast<std::int32_t>(count - 1);
   *jOff = static_cast<std::int32_t>(ax.offset);

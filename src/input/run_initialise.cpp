@@ -3,6 +3,7 @@
 #include <cstdio>
 #include <cstring>
 
+#include "control/log.h"
 #include "control/progress.h"
 #include "control/ranks.h"
 #include "control/run_driver.h"
@@ -11,6 +12,7 @@
 #include "state/run_state.h"
 #include "support/date_time.h"
 #include "support/file_description.h"
+#include "support/memory_limit.h"
 
 namespace karnet {
 namespace {
@@ -64,6 +66,23 @@ void fillResultHeader(FileDescription& d, const RunSettings& s) {
   std::snprintf(d.timeAxis.unit, sizeof d.timeAxis.unit, "sec");
 }
 
+// Ends the run before allocating when the result grid and the observation
+// arrays together need more memory than the process can ever get.
+void requireMemory(std::int64_t nj, std::int64_t nk, std::int64_t nl, std::int64_t observations) {
+  const std::uint64_t grid = byteSize(static_cast<std::uint64_t>(nj * nk * nl), sizeof(float));
+  const std::uint64_t scatter =
+      byteSize(static_cast<std::uint64_t>(observations), 4 * sizeof(double));
+  const std::uint64_t needed = grid > UINT64_MAX - scatter ? UINT64_MAX : grid + scatter;
+  const std::uint64_t limit = memoryLimitBytes();
+  if (needed <= limit) return;
+  logPrintf("\nResult grid of %lld x %lld x %lld nodes and %lld observations need %llu bytes;"
+            " at most %llu bytes of memory are available\n",
+            static_cast<long long>(nj), static_cast<long long>(nk), static_cast<long long>(nl),
+            static_cast<long long>(observations), static_cast<unsigned long long>(needed),
+            static_cast<unsigned long long>(limit));
+  reportInitError(-1, "Unable to allocate memory");
+}
+
 }  // namespace
 
 void runInitialise(RunState& state, const RunSettings& s) {
@@ -81,6 +100,7 @@ void runInitialise(RunState& state, const RunSettings& s) {
   state.observationFile = std::fopen(s.dataFileName, "rb");
   if (state.observationFile == nullptr) reportInitError(-1, "unable to open ASCII data file");
   const std::int64_t count = countLines(state.observationFile);
+  if (count <= kMaxElements) requireMemory(nj, nk, nl, count);
   if (count > kMaxElements || !scatterDataAlloc(state.scatter, count)) reportInitError(-1, "Unable to allocate memory");
 
   state.resultDescription = descriptionNew(3);

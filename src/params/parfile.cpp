@@ -1,7 +1,9 @@
 // Lookups and conversions over a loaded parameter file (see parfile.h).
 #include "params/parfile.h"
 
+#include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <cerrno>
 #include <cmath>
@@ -78,17 +80,26 @@ std::string directoryOf(const char* path) {
   return std::string(whole.substr(0, slash + 1));
 }
 
-// Reads the whole file; false when it cannot be read or is too large.
-bool readWholeFile(const char* path, std::string* text, bool* tooLarge) {
+// Reads the whole file; false when it cannot be read, is too large or is not a
+// regular file. Opening does not wait: a FIFO or a device is refused at once
+// instead of blocking the run or streaming without end.
+bool readWholeFile(const char* path, std::string* text, bool* tooLarge, bool* notRegular) {
   *tooLarge = false;
-  std::FILE* stream = std::fopen(path, "rb");
-  if (stream == nullptr) return false;
+  *notRegular = false;
+  const int fd = open(path, O_RDONLY | O_NONBLOCK | O_CLOEXEC | O_NOCTTY);
+  if (fd < 0) return false;
   struct stat info {};
-  if (fstat(fileno(stream), &info) != 0 || S_ISDIR(info.st_mode)) {
-    std::fclose(stream);
+  if (fstat(fd, &info) != 0 || !S_ISREG(info.st_mode)) {
+    *notRegular = !S_ISDIR(info.st_mode);
+    close(fd);
     return false;
   }
-  if (S_ISREG(info.st_mode) && static_cast<std::uintmax_t>(info.st_size) > kParMaxFileSize) {
+  std::FILE* stream = fdopen(fd, "rb");
+  if (stream == nullptr) {
+    close(fd);
+    return false;
+  }
+  if (static_cast<std::uintmax_t>(info.st_size) > kParMaxFileSize) {
     std::fclose(stream);
     *tooLarge = true;
     return false;
@@ -219,8 +230,11 @@ ParFile* parLoadFile(const char* path, int /*flags*/) {
   }
   std::string text;
   bool tooLarge = false;
-  if (!readWholeFile(path, &text, &tooLarge)) {
-    if (tooLarge) {
+  bool notRegular = false;
+  if (!readWholeFile(path, &text, &tooLarge, &notRegular)) {
+    if (notRegular) {
+      fail(kParErrorOpen, "Can't open " + displayNameOf(path) + " (not a regular file)");
+    } else if (tooLarge) {
       fail(kParErrorTooLarge, "Can't open " + displayNameOf(path) + " (larger than " +
                                   std::to_string(kParMaxFileSize) + " bytes)");
     } else {

@@ -1,10 +1,12 @@
 #include "params/run_setup.h"
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cstdio>
 #include <cstring>
 
+#include "control/command_line.h"
 #include "control/termination.h"
 #include "input/bathymetry_read.h"
 #include "input/cartography.h"
@@ -26,7 +28,32 @@ void copyText(char* destination, std::size_t size, const char* source) {
   destination[n] = '\0';
 }
 
-bool readable(const char* path) { return path[0] != '\0' && ::access(path, R_OK) == 0; }
+// Inputs must be readable regular files: a FIFO or a device would block the run
+// or never end.
+bool readable(const char* path) {
+  struct stat info;
+  return path[0] != '\0' && ::access(path, R_OK) == 0 && ::stat(path, &info) == 0 &&
+         S_ISREG(info.st_mode);
+}
+
+// True when both names lead to one existing file (also through links).
+bool sameFile(const char* a, const char* b) {
+  struct stat first, second;
+  return a[0] != '\0' && b[0] != '\0' && ::stat(a, &first) == 0 && ::stat(b, &second) == 0 &&
+         first.st_dev == second.st_dev && first.st_ino == second.st_ino;
+}
+
+// The result replaces whatever file has its name: when that is one of the
+// run's own files (an input, the parameter file or the log), the run would
+// destroy it, so it is refused before anything is computed.
+bool resultIsOwnFile(const char* parameterFile) {
+  const char* result = runParameters.outputData.FileName;
+  char logFileName[kFileNameSize];
+  const bool hasLog = makeLogFileName(parameterFile, logFileName) != 0;
+  return sameFile(result, runParameters.inputFiles.FileName) ||
+         sameFile(result, runParameters.inputFiles.DataFileName) ||
+         sameFile(result, parameterFile) || (hasLog && sameFile(result, logFileName));
+}
 
 // Settings that come from the bathymetry header and the parameters.
 void deriveSettings(const FileDescription& bathymetry, RunSettings& s) {
@@ -127,6 +154,11 @@ int setupRun(const char* parameterFile) {
 
   char message[1024];
   if (checkRunSettings(message, sizeof message) == 0) fatalError(message);
+  if (resultIsOwnFile(parameterFile)) {
+    std::snprintf(message, sizeof message, "ERROR: result file %s is one of the run's own files",
+                  runParameters.outputData.FileName);
+    fatalError(message);
+  }
 
   const double longitude = bathymetry->axes[1].origin;
   const double latitude = bathymetry->axes[2].origin;

@@ -1,6 +1,7 @@
 #include "params/parfile.h"
 
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 
 #include <unistd.h>
 
@@ -152,6 +153,15 @@ TEST_F(ParFileTest, LoadFailures) {
   EXPECT_EQ(parLoadFile(big.c_str(), 1), nullptr);
   EXPECT_EQ(parPeekErrorGlb(), kParErrorTooLarge);
   EXPECT_EQ(std::string(parErrorTextGlb()).rfind("Can't open big.pfs", 0), 0u);
+
+  // A FIFO without a writer would block the open, a device never ends: both
+  // are refused at once.
+  const std::string fifo = dir_.file("fifo.pfs");
+  ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
+  EXPECT_EQ(parLoadFile(fifo.c_str(), 1), nullptr);
+  EXPECT_STREQ(parErrorTextGlb(), "Can't open fifo.pfs (not a regular file)");
+  EXPECT_EQ(parLoadFile("/dev/zero", 1), nullptr);
+  EXPECT_STREQ(parErrorTextGlb(), "Can't open zero (not a regular file)");
 }
 
 TEST_F(ParFileTest, Conversions) {
