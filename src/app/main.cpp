@@ -115,8 +115,9 @@ int main(int argc, char** argv) {
       karnet::ranksAbort(1);
     }
   }
-  const bool hostMode =
-      karnet::hasHostModeArgument(argumentCount, argumentVector) && karnet::rankLeads();
+  // Every rank runs in the mode asked for, so that a cancel (SIGUSR1, which
+  // mpirun passes on to all of them) reaches each.
+  const bool hostMode = karnet::hasHostModeArgument(argumentCount, argumentVector);
   setenv("H84", hostMode ? "APV" : "WIN", 1);
 
   if (answerInformationRequest(argumentCount, argumentVector)) {

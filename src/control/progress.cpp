@@ -6,6 +6,7 @@
 #include <ctime>
 
 #include "control/host.h"
+#include "control/ranks.h"
 #include "control/signals.h"
 #include "control/termination.h"
 
@@ -64,7 +65,10 @@ void progressReport(std::int64_t done) {
 
 int progressCheckCancel() {
   handlePendingSignal();
-  if (apvCancel() != 0) {
+  // A cancel asked for on the first rank of a run over several reaches the
+  // others here; each then ends as the first does.
+  if (apvCancel() != 0 || ranksCancelAnnounced()) {
+    ranksAnnounceCancel();
     apvMessage("Cancel computation", "", kYesNoStyle);
     exitRun(0);
   }

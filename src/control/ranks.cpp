@@ -27,8 +27,10 @@ bool endAgreed = false;
 // rank that ends early never meets one of those by mistake.
 MPI_Comm endComm = MPI_COMM_NULL;
 #endif
+constexpr int kCancelTag = 1;
+bool cancelAnnounced = false;
 // How long an ending rank waits for the others to end as well.
-constexpr double kEndWaitSeconds = 10.0;
+constexpr double kEndWaitSeconds = 5.0;
 
 }  // namespace
 
@@ -141,6 +143,36 @@ std::int32_t ranksAgreeOnEnd(std::int32_t ownCode) {
   }
 #endif
   return ownCode;
+}
+
+void ranksAnnounceCancel() {
+#ifdef KARNET_WITH_MPI
+  if (!joined || finished || ownRank != 0 || cancelAnnounced) return;
+  cancelAnnounced = true;
+  static int word = 1;
+  for (int r = 1; r < rankTotal; ++r) {
+    MPI_Request request = MPI_REQUEST_NULL;
+    MPI_Isend(&word, 1, MPI_INT, r, kCancelTag, endComm, &request);
+    MPI_Request_free(&request);
+  }
+#endif
+}
+
+bool ranksCancelAnnounced() {
+#ifdef KARNET_WITH_MPI
+  if (!joined || finished || ownRank == 0) return false;
+  if (cancelAnnounced) return true;
+  int arrived = 0;
+  MPI_Iprobe(0, kCancelTag, endComm, &arrived, MPI_STATUS_IGNORE);
+  if (arrived != 0) {
+    int word = 0;
+    MPI_Recv(&word, 1, MPI_INT, 0, kCancelTag, endComm, MPI_STATUS_IGNORE);
+    cancelAnnounced = true;
+  }
+  return cancelAnnounced;
+#else
+  return false;
+#endif
 }
 
 void ranksEnd(std::int32_t exitCode) {

@@ -47,6 +47,11 @@ std::int32_t ranksAgreeOnEnd(std::int32_t ownCode);
 // MPI_Finalize would wait for them forever).
 void ranksEnd(std::int32_t exitCode);
 
+// A cancel of the run: rank 0 tells every other rank (once, without
+// waiting); the others look whether it did, without waiting either.
+void ranksAnnounceCancel();
+bool ranksCancelAnnounced();
+
 // Ends every rank of the job at once with the code, from any one rank: for a
 // failure that the other ranks cannot know of.
 [[noreturn]] void ranksAbort(std::int32_t exitCode);
