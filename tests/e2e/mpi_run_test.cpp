@@ -1,8 +1,11 @@
 // One run over the ranks of an MPI job gives what the plain run gives: the
 // same exit code, messages, log and result bytes.
 #include <gtest/gtest.h>
+#include <signal.h>
 
+#include <filesystem>
 #include <map>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -110,6 +113,68 @@ TEST_F(MpiRun, InvalidSettingsEndEveryRankWithTheSameMessage) {
   p.projection = "'LOCAL'";
   p.spacing = "0";
   expectSameAsPlain(p, 1);
+}
+
+// The process of rank 0 of the job working in dir, or 0.
+int rankZeroIn(const std::string& dir) {
+  std::error_code ignored;
+  for (const auto& entry : std::filesystem::directory_iterator("/proc", ignored)) {
+    const std::string name = entry.path().filename().string();
+    if (name.find_first_not_of("0123456789") != std::string::npos) continue;
+    if (std::filesystem::read_symlink(entry.path() / "cwd", ignored) != dir) continue;
+    const std::string environment = readFile(entry.path().string() + "/environ");
+    if (environment.find(std::string("OMPI_COMM_WORLD_RANK=0") + '\0') != std::string::npos ||
+        environment.rfind("OMPI_COMM_WORLD_RANK=0", 0) == 0) {
+      return std::stoi(name);
+    }
+  }
+  return 0;
+}
+
+TEST_F(MpiRun, CancelOnRankZeroEndsEveryRank) {
+  // A basin large enough to be cancelled while its levels are analysed.
+  TempDir dir;
+  BathymetrySpec b;
+  b.nx = b.ny = 300;
+  b.spacing = 100.0;
+  b.projection = "LOCAL";
+  b.originLongitude = b.originLatitude = 0.0;
+  b.heights.assign(static_cast<std::size_t>(b.nx) * b.ny, -61.0f);
+  writeBathymetry(dir.file("bathymetry.nc"), b);
+  std::ostringstream obs;
+  for (int j = 5; j < b.ny; j += 10) {
+    for (int i = 5; i < b.nx; i += 10) {
+      for (double z = -0.5; z > -60.0; z -= 1.5) obs << i * 100 << ' ' << j * 100 << ' ' << z << ' ' << 8.0 + 0.1 * z << '\n';
+    }
+  }
+  writeFile(dir.file("observations.txt"), obs.str());
+  ParameterFile p;
+  p.projection = "'LOCAL'";
+  p.analysis = "objective";
+  p.zRange = "0, 39";
+  p.spacing = "1.5";
+  p.correlationSampleSize = "30";
+  writeFile(dir.file("case.pfs"), p.render());
+
+  bool signalled = false;
+  const ProcessResult run = runProgram(
+      KARNET_MPIEXEC, {"-np", "2", KARNET_BINARY, "//apv", "case.pfs"}, dir.path(), kEnvironment,
+      [&](int) {
+        // Once the levels are being analysed, rank 0 alone is asked to cancel.
+        if (readFile(dir.file("case.log")).find("Basic grid parameters") == std::string::npos) {
+          return false;
+        }
+        const int rankZero = rankZeroIn(dir.path());
+        if (rankZero != 0) signalled = kill(rankZero, SIGUSR1) == 0;
+        return signalled;
+      });
+  ASSERT_TRUE(signalled);
+  // Every rank ended as rank 0 did and left the job: mpirun reports 0 only then.
+  EXPECT_EQ(run.exitCode, 0) << run.err;
+  EXPECT_FALSE(fileExists(dir.file("result.nc")));
+  const std::string log = readFile(dir.file("case.log"));
+  EXPECT_EQ(log.find("Statistics for local grid"), std::string::npos);
+  EXPECT_NE(log.find("Completion code : Successful"), std::string::npos);
 }
 
 }  // namespace
