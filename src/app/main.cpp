@@ -103,6 +103,12 @@ int main(int argc, char** argv) {
   // Under an MPI launcher every process is one rank of the run; the first
   // speaks for all of them: the others' messages and progress go nowhere.
   karnet::ranksInit(&argc, &argv);
+  if (!karnet::ranksAvailable() && karnet::ranksLaunchedCount() > 1) {
+    // Each process would make the whole run and write the same files.
+    std::fputs("karnet: this karnet was built without MPI (CMake option KARNET_MPI): run it "
+               "without mpirun, or build it with MPI\n", stderr);
+    return 1;
+  }
   // The platform hands the arguments already split; the program's own name is
   // not one of them.
   argumentCount = argc > 0 ? argc - 1 : 0;

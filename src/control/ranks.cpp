@@ -19,18 +19,18 @@ namespace {
 
 int ownRank = 0;
 int rankTotal = 1;
+#ifdef KARNET_WITH_MPI
 bool joined = false;
 bool finished = false;
 bool endAgreed = false;
-#ifdef KARNET_WITH_MPI
 // The ending ranks meet here, apart from the run's own collectives, so that a
 // rank that ends early never meets one of those by mistake.
 MPI_Comm endComm = MPI_COMM_NULL;
-#endif
 constexpr int kCancelTag = 1;
 bool cancelAnnounced = false;
 // How long an ending rank waits for the others to end as well.
 constexpr double kEndWaitSeconds = 5.0;
+#endif
 
 }  // namespace
 
@@ -49,6 +49,14 @@ bool ranksLaunched() {
     if (std::getenv(name) != nullptr) return true;
   }
   return false;
+}
+
+int ranksLaunchedCount() {
+  for (const char* name : {"OMPI_COMM_WORLD_SIZE", "PMI_SIZE"}) {
+    const char* text = std::getenv(name);
+    if (text != nullptr) return std::atoi(text) > 1 ? std::atoi(text) : 1;
+  }
+  return 1;
 }
 
 void ranksInit(int* argc, char*** argv) {

@@ -20,6 +20,10 @@ void ranksFinish();
 // (read from the launcher's environment).
 bool ranksLaunched();
 
+// The number of processes the launcher started (1 without a launcher), from
+// its environment; also known to a build without MPI.
+int ranksLaunchedCount();
+
 int rankIndex();  // 0 .. rankCount() - 1
 int rankCount();  // 1 for a plain run
 inline bool rankLeads() { return rankIndex() == 0; }
