@@ -203,6 +203,10 @@ void ranksEnd(std::int32_t exitCode) {
       nanosleep(&pause, nullptr);
     }
     if (done == 0) return;
+  } else if (rankTotal > 1) {
+    // No rank leaves before all have closed their log: the launcher ends the
+    // job as soon as one rank exits with an error.
+    MPI_Barrier(endComm);
   }
   ranksFinish();
 #else
