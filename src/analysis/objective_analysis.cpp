@@ -133,8 +133,10 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
 
   setadj(lastObs, state, settings);
 
+  // Progress runs over the levels this process holds (all of them alone).
+  const LevelRange held = state.heldSteps(lOff, std::int64_t{settings.lx} - settings.l0 + 1);
   progressStartGrid(settings.jx - settings.j0, settings.kx - settings.k0,
-                    settings.lx - settings.l0);
+                    held.count > 0 ? held.count - 1 : 0);
   progressStatus("Interpolating ...");
 
   const double deleteValue = state.deleteValue();
@@ -150,15 +152,14 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
   input.deleteValue = deleteValue;
   input.jOff = jOff;
   input.kOff = kOff;
-  input.lOff = lOff;
+  input.lOff = lOff + held.first;  // progress counts from the first level held
 
   OaWorkspace ws;
   std::int64_t dataCells = 0;
   std::int64_t interpolations = 0;
   std::int64_t failures = 0;
-  for (std::int32_t l = lOff; l <= lLast; ++l) {
-    // Only the levels this process holds (all of them when it runs alone).
-    if (l < state.basicValues.l0 || l >= state.basicValues.l0 + state.basicValues.nl) continue;
+  // Only the levels this process holds (all of them when it runs alone).
+  for (std::int32_t l = lOff + held.first; l < lOff + held.end() && l <= lLast; ++l) {
     grid3DLayerGet(state.basicBathymetry, l, state.layerBathymetry);
     grid3DLayerGet(state.basicValues, l, state.layerValues);
     grid2DCopyWindow(analysisGrid, state.layerValues);

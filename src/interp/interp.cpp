@@ -98,7 +98,10 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
   const std::int64_t spanJ = std::int64_t{settings.jx} - settings.j0;
   const std::int64_t spanK = std::int64_t{settings.kx} - settings.k0;
   const std::int64_t spanL = std::int64_t{settings.lx} - settings.l0;
-  progressStart(spanK * spanJ * spanL);
+  // Only the levels this process holds (all of them when it runs alone), and
+  // progress over them.
+  const LevelRange held = state.heldSteps(lOff, spanL + 1);
+  progressStart(spanK * spanJ * (held.count > 0 ? held.count - 1 : 0));
   std::int64_t done = 0;
   InterpolationCounts counts;
 
@@ -121,7 +124,7 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
   const std::int64_t kFirst = std::max<std::int64_t>(kOff, 0);
   const std::int64_t kLast = std::min<std::int64_t>(kOff + spanK, nk - 1);
 
-  for (std::int64_t s = 0; s <= spanL; ++s) {
+  for (std::int64_t s = held.first; s < held.end(); ++s) {
     progressReport(done);
     done += spanK * spanJ;
     const std::int64_t lb = lOff + s;

@@ -1,6 +1,7 @@
 #ifndef KARNET_STATE_RUN_STATE_H_
 #define KARNET_STATE_RUN_STATE_H_
 
+#include <algorithm>
 #include <cstdint>
 #include <cstdio>
 
@@ -50,6 +51,17 @@ struct RunState {
 
   // Levels of the whole basic grid, held here or not.
   std::int32_t basicLevelCount() const { return basicLevels > 0 ? basicLevels : basicValues.nl; }
+  // The layers of a layer pass over the local grid's levels (pass step s is
+  // basic level lOff + s, s = 0 .. steps - 1) that this process holds: the
+  // steps first .. first + count - 1.
+  LevelRange heldSteps(std::int32_t lOff, std::int64_t steps) const {
+    const std::int64_t first = std::max<std::int64_t>(std::int64_t{basicValues.l0} - lOff, 0);
+    const std::int64_t end =
+        std::min<std::int64_t>(std::int64_t{basicValues.l0} + basicValues.nl - lOff, steps);
+    if (end <= first) return LevelRange{0, 0};
+    return LevelRange{static_cast<std::int32_t>(first), static_cast<std::int32_t>(end - first)};
+  }
+
   // True when this process holds every level of the basic grid.
   bool holdsAllLevels() const {
     return basicValues.l0 == 0 && basicValues.nl == basicLevelCount();
