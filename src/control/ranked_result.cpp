@@ -13,8 +13,8 @@
 namespace karnet {
 
 int writeRankedResult(const RunInvocation& invocation, RunState& state,
-                      const RunSettings& settings, const ObservationTally& tally,
-                      RunSummary* summary) {
+                      const RunParameters& parameters, const RunSettings& settings,
+                      const ObservationTally& tally, RunSummary* summary) {
   const FileDescription& description = *state.resultDescription;
   const std::int32_t nx = description.axes[1].lastIndex + 1;
   const std::int32_t ny = description.axes[2].lastIndex + 1;
@@ -29,7 +29,7 @@ int writeRankedResult(const RunInvocation& invocation, RunState& state,
   }
 
   RunSummary counted;
-  counted.resultPath = runParameters.outputData.FileName;
+  counted.resultPath = parameters.outputData.FileName;
   counted.observations = tally;
   counted.nx = nx;
   counted.ny = ny;
@@ -45,10 +45,10 @@ int writeRankedResult(const RunInvocation& invocation, RunState& state,
 
   progressStatus("Saving data ...");
   const TextAttributes attributes = resultGlobalAttributes(
-      runParameters, invocation.commandLine, KARNET_VERSION, resultTimestamp());
+      parameters, invocation.commandLine, KARNET_VERSION, resultTimestamp());
   const int written =
-      resultWriteLevels(runParameters.outputData.FileName, description,
-                        runParameters.outputData.ItemType, levels, settings.projection, &attributes);
+      resultWriteLevels(parameters.outputData.FileName, description,
+                        parameters.outputData.ItemType, levels, settings.projection, &attributes);
   // A writer that stopped early leaves levels on their way.
   gather.drain();
   if (summary != nullptr) *summary = counted;

@@ -5,6 +5,7 @@
 
 namespace karnet {
 
+struct RunParameters;
 struct RunSettings;
 struct RunSummary;
 struct ObservationTally;
@@ -14,8 +15,8 @@ struct ObservationTally;
 // writes the result file from them (and counts the summary's nodes on the
 // way). Returns the writer's result on the first process, 1 on the others.
 int writeRankedResult(const RunInvocation& invocation, RunState& state,
-                      const RunSettings& settings, const ObservationTally& tally,
-                      RunSummary* summary);
+                      const RunParameters& parameters, const RunSettings& settings,
+                      const ObservationTally& tally, RunSummary* summary);
 
 }  // namespace karnet
 

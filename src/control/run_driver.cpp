@@ -47,7 +47,7 @@ int runPhases(const RunInvocation& invocation, RunSummary* summary) {
     interp(lastObs, jOff, kOff, lOff, state, settings);
   }
   // Over several processes the levels meet only in the result file.
-  if (rankCount() > 1) return writeRankedResult(invocation, state, settings, tally, summary);
+  if (rankCount() > 1) return writeRankedResult(invocation, state, runParameters, settings, tally, summary);
   glo2loc(jOff, kOff, lOff, state, settings);
   if (summary != nullptr) {
     summary->resultPath = runParameters.outputData.FileName;
