@@ -176,7 +176,7 @@ void BM_BilinearLayer(benchmark::State& state) {
   testing::TestRun run(500, 500, 1);
   run.settings.SearchRadius = 10.0f;
   const std::int32_t lastObs = observeCasts(run, 0.02, 9);
-  for (auto _ : state) interp(lastObs, 0, 0, 0, run.state, run.settings);
+  for (auto _ : state) interp(lastObs, 0, 0, 0, run.state, run.context());
   state.SetItemsProcessed(state.iterations() * 500 * 500);
   logSetStream(nullptr);
   std::fclose(sink);

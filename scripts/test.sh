@@ -4,6 +4,7 @@
 # runs them there too. Exit status 0 only when both pass.
 # Last, each libFuzzer harness runs for 30 seconds (scripts/fuzz.sh, in build-fuzz/).
 #   KARNET_NO_SANITIZE=1 scripts/test.sh   skips the sanitizer build.
+#   KARNET_TSAN=1 scripts/test.sh          also runs the threaded tests under ThreadSanitizer.
 #   KARNET_NO_FUZZ=1 scripts/test.sh       skips the fuzzing.
 set -euo pipefail
 cd "$(dirname "$0")/.."
@@ -25,5 +26,12 @@ if [ "${KARNET_NO_SANITIZE:-0}" != "1" ]; then
 fi
 if [ "${KARNET_NO_FUZZ:-0}" != "1" ]; then
   ./scripts/fuzz.sh 30
+fi
+if [ "${KARNET_TSAN:-0}" = "1" ]; then
+  # Only the threaded kernel tests, so that this stays short.
+  CC=clang CXX=clang++ cmake -S . -B build-tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo -DKARNET_TSAN=ON \
+    -DKARNET_BUILD_TESTS=ON
+  cmake --build build-tsan -j "$jobs" --target test_interp_threads test_analysis_threads
+  (cd build-tsan && ctest --output-on-failure -j "$jobs" -L threads -R "interp_threads|analysis_threads")
 fi
 echo "test.sh: all tests passed"

@@ -1,6 +1,8 @@
 // The optimal-interpolation estimator of one node.
 #include "analysis/objan.h"
 
+#include <algorithm>
+
 #include "analysis/correlation.h"
 #include "analysis/invmtx.h"
 
@@ -51,12 +53,33 @@ void removeWeightedMean(const OaWorkspace& ws, const float* a, float* values, st
   for (std::int32_t i = 0; i < n; ++i) values[i] = values[i] - mean;
 }
 
-std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSettings& settings) {
+bool InverseCache::holds(const std::int32_t* cells, std::int32_t m) const {
+  return count == m && std::equal(cells, cells + m, chosen);
+}
+
+void InverseCache::keep(const std::int32_t* cells, std::int32_t m, std::int32_t inverted,
+                        const char* reason) {
+  std::copy(cells, cells + m, chosen);
+  count = m;
+  result = inverted;
+  errorText = reason;
+}
+
+std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSettings& settings,
+                   InverseCache* cache) {
   if (m < 1) {
     ws.errorText = "No observational data in OBJAN";
     return -1;
   }
-  if (buildCorrelationMatrix(ws, m, settings) != 0) return -1;
+  std::int32_t inverted = 0;
+  if (cache != nullptr && cache->holds(ws.selIndex, m)) {
+    inverted = cache->result;
+    ws.errorText = cache->errorText;
+  } else {
+    inverted = buildCorrelationMatrix(ws, m, settings);
+    if (cache != nullptr) cache->keep(ws.selIndex, m, inverted, ws.errorText);
+  }
+  if (inverted != 0) return -1;
 
   float mean = 0.0f;
   float weightSum = 0.0f;

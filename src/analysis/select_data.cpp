@@ -197,6 +197,7 @@ std::int32_t selectData(OaWorkspace& ws, std::int32_t j, std::int32_t k,
       for (std::int32_t p = 0; p < kept; ++p) {
         const auto from = static_cast<std::int32_t>(ws.candKey[p] & 0xffffffffu);
         const std::int32_t i = ws.candIndex[from];
+        ws.selIndex[p] = i;
         ws.selX[p] = ws.dataX[i];
         ws.selY[p] = ws.dataY[i];
         ws.selValue[p] = ws.dataValue[i];
@@ -208,6 +209,7 @@ std::int32_t selectData(OaWorkspace& ws, std::int32_t j, std::int32_t k,
   }
   for (std::int32_t p = 0; p < kept; ++p) {
     const std::int32_t i = ws.candIndex[p];
+    ws.selIndex[p] = i;
     ws.selX[p] = ws.dataX[i];
     ws.selY[p] = ws.dataY[i];
     ws.selValue[p] = ws.dataValue[i];

@@ -17,8 +17,8 @@ void sortByCorrelation(float* corr, std::int32_t* index, std::int32_t n);
 // Chooses the data cells for node (j, k): every cell of ws.dataX/dataY/
 // dataValue (ws.dataCount of them) within SearchRadius becomes a candidate; when
 // there are more than ws.limit candidates the best-correlated ws.limit are kept,
-// otherwise all in collection order. Fills selX, selY, selValue, selCorr and
-// returns their number m (0 <= m <= limit).
+// otherwise all in collection order. Fills selIndex, selX, selY, selValue,
+// selCorr and returns their number m (0 <= m <= limit).
 std::int32_t selectData(OaWorkspace& ws, std::int32_t j, std::int32_t k,
                         const RunSettings& settings);
 

@@ -63,6 +63,7 @@ void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::i
   ws.candCorr = allocateEntries<float>(data);
   ws.candKey = allocateEntries<std::uint64_t>(data);
 
+  ws.selIndex = allocateEntries<std::int32_t>(limit);
   ws.selX = allocateEntries<float>(limit);
   ws.selY = allocateEntries<float>(limit);
   ws.selValue = allocateEntries<float>(limit);
@@ -135,6 +136,7 @@ void workspaceRelease(OaWorkspace& ws) {
   release(ws.candIndex);
   release(ws.candCorr);
   release(ws.candKey);
+  release(ws.selIndex);
   release(ws.selX);
   release(ws.selY);
   release(ws.selValue);

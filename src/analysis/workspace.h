@@ -33,7 +33,9 @@ struct OaWorkspace {
   // candidate's position), one entry per data cell.
   std::uint64_t* candKey = nullptr;
 
-  // The cells chosen for the node (limit entries each).
+  // The cells chosen for the node (limit entries each): their index among the
+  // data cells, position, value and correlation with the node.
+  std::int32_t* selIndex = nullptr;
   float* selX = nullptr;
   float* selY = nullptr;
   float* selValue = nullptr;

@@ -14,11 +14,12 @@
 #include "control/ranks.h"
 #include "control/run_driver.h"
 #include "control/termination.h"
-#include "params/run_setup.h"
+#include "control/threads.h"
 
 namespace {
 
 constexpr char kUsage[] = "Usage: karnet.exe [//apv] [options] pfs-file";
+constexpr char kThreadsError[] = "--threads and KARNET_THREADS take a number from 1 to 4096";
 
 constexpr char kHelp[] =
     "\n"
@@ -31,6 +32,9 @@ constexpr char kHelp[] =
     "  //apv      run under the progress display; q or SIGUSR1 cancels the run\n"
     "  --quiet    no summary (result, grid, observations) on stderr at the end\n"
     "  -debug     accepted, without effect\n"
+    "  --threads N\n"
+    "             threads of the computation (default: KARNET_THREADS, else all\n"
+    "             cores); the result is the same for any number\n"
     "  --help     this text\n"
     "  --version  the program's version\n"
     "\n"
@@ -57,8 +61,13 @@ const char* programPath = "karnet";
 [[noreturn]] void runMain(int count, char** arguments) {
   char parameterFile[karnet::kFileNameSize];
   if (karnet::selectParameterFile(count, arguments, parameterFile) == 0) {
-    karnet::fatalError(kUsage);
+    karnet::endRun(karnet::RunError::fatal(kUsage));
   }
+  int threads = 0;
+  if (karnet::selectThreadCount(count, arguments, std::getenv("KARNET_THREADS"), &threads) == 0) {
+    karnet::endRun(karnet::RunError::fatal(kThreadsError));
+  }
+  if (threads == 0) threads = karnet::defaultThreadCount();
 
   char logFileName[karnet::kFileNameSize];
   std::FILE* log = nullptr;
@@ -76,8 +85,8 @@ const char* programPath = "karnet";
   karnet::RunInvocation invocation;
   invocation.commandLine = karnet::commandLineText(programPath, count, arguments);
   invocation.quiet = karnet::hasQuietArgument(count, arguments);
-  karnet::setupRun(parameterFile);
-  karnet::runDriver(invocation);
+  invocation.threads = threads;
+  karnet::runProgram(parameterFile, invocation);
 }
 
 int hostEntry() { runMain(argumentCount, argumentVector); }

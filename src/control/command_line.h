@@ -15,6 +15,14 @@ inline constexpr std::size_t kFileNameSize = 260;
 // progress host.
 bool hasHostModeArgument(int count, const char* const* arguments);
 
+// The number of threads of the computation: from "--threads N" or
+// "--threads=N" among the arguments (the last one counts), else from the
+// environment variable's text (KARNET_THREADS; null or empty: not set).
+// Returns 1 with threads set, or with 0 when neither gives one (the caller's
+// default); 0 when the number given is not a whole number from 1 to 4096.
+int selectThreadCount(int count, const char* const* arguments, const char* environment,
+                      int* threads);
+
 // True when some argument equals "--quiet" (any case): no summary at the end.
 bool hasQuietArgument(int count, const char* const* arguments);
 
@@ -22,7 +30,8 @@ bool hasQuietArgument(int count, const char* const* arguments);
 // blanks or quotes single-quoted), for the record of how a result was made.
 std::string commandLineText(const char* program, int count, const char* const* arguments);
 
-// Copies the last argument that is not "//apv", "--quiet", "-debug" or empty (any case)
+// Copies the last argument that is not "//apv", "--quiet", "-debug", a thread
+// count ("--threads N", "--threads=N") or empty (any case)
 // into name (kFileNameSize characters, always terminated; empty when there is
 // none). Returns 1 when that name is also the last argument, as the usage
 // requires, else 0. A name that does not fit the buffer is not the last

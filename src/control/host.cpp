@@ -12,6 +12,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <atomic>
 #include <cerrno>
 #include <cstdint>
 #include <cstdio>
@@ -62,7 +63,8 @@ Display display;
 Keyboard keyboard;
 struct termios savedTerminal {};
 volatile sig_atomic_t terminalModified = 0;
-volatile sig_atomic_t cancelSignalled = 0;
+// Set by SIGUSR1 on whatever thread it lands; read by the driving thread.
+std::atomic<int> cancelSignalled{0};
 volatile sig_atomic_t resumed = 0;
 
 std::int64_t monotonicNs() {

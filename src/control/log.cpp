@@ -3,6 +3,7 @@
 
 #include <cstdarg>
 #include <cstring>
+#include <vector>
 
 namespace karnet {
 
@@ -35,6 +36,46 @@ void logClose() {
   } else {
     std::fclose(stream);
   }
+}
+
+void Report::write(const char* text) {
+  if (text == nullptr) return;
+  put(text);
+  if (std::strchr(text, '\n') == nullptr) put("\n");
+}
+
+void Report::printf(const char* format, ...) {
+  if (format == nullptr) return;
+  va_list arguments;
+  va_start(arguments, format);
+  va_list again;
+  va_copy(again, arguments);
+  char small[256];
+  const int length = std::vsnprintf(small, sizeof small, format, arguments);
+  va_end(arguments);
+  if (length < 0) {
+    va_end(again);
+    return;
+  }
+  if (static_cast<std::size_t>(length) < sizeof small) {
+    va_end(again);
+    put(std::string_view(small, static_cast<std::size_t>(length)));
+    return;
+  }
+  std::vector<char> large(static_cast<std::size_t>(length) + 1);
+  std::vsnprintf(large.data(), large.size(), format, again);
+  va_end(again);
+  put(std::string_view(large.data(), static_cast<std::size_t>(length)));
+}
+
+void LogReport::put(std::string_view text) {
+  if (logStream == nullptr || text.empty()) return;
+  std::fwrite(text.data(), 1, text.size(), logStream);
+}
+
+Report& runLog() {
+  static LogReport log;
+  return log;
 }
 
 }  // namespace karnet

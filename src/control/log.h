@@ -2,6 +2,8 @@
 #define KARNET_CONTROL_LOG_H_
 
 #include <cstdio>
+#include <string>
+#include <string_view>
 
 namespace karnet {
 
@@ -15,6 +17,40 @@ void logWrite(const char* text);
 // printf-style write to the log stream (nothing when it is null), no newline rule.
 void logPrintf(const char* format, ...) __attribute__((format(printf, 1, 2)));
 void logClose();
+
+// Where the phases send their report lines. The run's log is one sink; a
+// ReportBuffer collects the lines of work done on other threads, which the
+// driving thread then passes on in a fixed order.
+class Report {
+ public:
+  virtual ~Report() = default;
+  // The text exactly as given.
+  virtual void put(std::string_view text) = 0;
+  // The log's newline rule: "\n" is added when text holds no newline at all.
+  void write(const char* text);
+  void printf(const char* format, ...) __attribute__((format(printf, 2, 3)));
+};
+
+// The run's log stream (logStream as it is at each write).
+class LogReport final : public Report {
+ public:
+  void put(std::string_view text) override;
+};
+
+class ReportBuffer final : public Report {
+ public:
+  void put(std::string_view text) override { text_ += text; }
+  const std::string& text() const { return text_; }
+  void passTo(Report& report) const {
+    if (!text_.empty()) report.put(text_);
+  }
+
+ private:
+  std::string text_;
+};
+
+// The report sink of the run's log.
+Report& runLog();
 
 }  // namespace karnet
 

@@ -2,18 +2,17 @@
 // and the cancel question.
 #include "control/progress.h"
 
+#include <chrono>
 #include <cmath>
 #include <ctime>
 
 #include "control/host.h"
 #include "control/ranks.h"
 #include "control/signals.h"
-#include "control/termination.h"
+#include "support/run_error.h"
 
 namespace karnet {
 namespace {
-
-constexpr int kYesNoStyle = 4;
 
 std::int64_t systemClock() { return static_cast<std::int64_t>(std::time(nullptr)); }
 
@@ -69,8 +68,7 @@ int progressCheckCancel() {
   // others here; each then ends as the first does.
   if (apvCancel() != 0 || ranksCancelAnnounced()) {
     ranksAnnounceCancel();
-    apvMessage("Cancel computation", "", kYesNoStyle);
-    exitRun(0);
+    throw RunError::cancelled();
   }
   return 0;
 }
@@ -83,6 +81,44 @@ void progressStartGrid(std::int32_t e1, std::int32_t e2, std::int32_t e3) {
 
 void progressReportGrid(std::int32_t i, std::int32_t j, std::int32_t k) {
   progressReport((count.firstExtent * k + i) * count.secondExtent + j + 1);
+}
+
+WorkProgress::WorkProgress(std::int64_t total, std::int64_t done)
+    : done_(done), driver_(std::this_thread::get_id()) {
+  progressStart(total);
+}
+
+void WorkProgress::fail(std::exception_ptr error, std::int64_t order) {
+  while (errorLock_.test_and_set(std::memory_order_acquire)) {
+  }
+  if (error_ == nullptr || order < errorOrder_) {
+    error_ = error;
+    errorOrder_ = order;
+  }
+  errorLock_.clear(std::memory_order_release);
+  stop_.store(true, std::memory_order_relaxed);
+}
+
+void WorkProgress::poll() {
+  if (std::this_thread::get_id() != driver_ || stopped()) return;
+  try {
+    progressReport(done_.load(std::memory_order_relaxed));
+  } catch (...) {
+    // A cancel or an interrupt comes before any error a worker may still meet.
+    fail(std::current_exception(), INT64_MIN);
+  }
+}
+
+void WorkProgress::watchUntilDone(std::int64_t items) {
+  if (std::this_thread::get_id() != driver_) return;
+  while (items_.load(std::memory_order_relaxed) < items) {
+    poll();
+    std::this_thread::sleep_for(std::chrono::milliseconds(20));
+  }
+}
+
+void WorkProgress::finish() {
+  if (error_ != nullptr) std::rethrow_exception(error_);
 }
 
 }  // namespace karnet

@@ -2,6 +2,9 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <new>
+#include <stdexcept>
+#include <string>
 
 #include "analysis/objective_analysis.h"
 #include "control/log.h"
@@ -11,6 +14,7 @@
 #include "control/run_summary.h"
 #include "control/signals.h"
 #include "control/termination.h"
+#include "input/bathymetry_read.h"
 #include "input/bathymetry_scan.h"
 #include "input/data_scan.h"
 #include "input/run_initialise.h"
@@ -18,47 +22,94 @@
 #include "interp/interp.h"
 #include "output/result_attributes.h"
 #include "output/result_write.h"
-#include "params/run_parameters.h"
-#include "params/run_settings.h"
-#include "state/run_state.h"
+#include "params/run_setup.h"
+#include "state/run_context.h"
+#include "support/run_error.h"
 
 namespace karnet {
+namespace {
 
-void reportInitError(std::int32_t /*lineNumber*/, const char* message) {
-  logPrintf("\nERROR: %s\n", message);
-  exitRun(1);
+struct DescriptionDeleter {
+  void operator()(FileDescription* description) const { descriptionFree(description); }
+};
+
+RunContext contextOf(Run& run) {
+  return RunContext{run.settings, runLog(), run.cartography.get(), run.invocation.threads};
 }
 
-int runPhases(const RunInvocation& invocation, RunSummary* summary) {
-  RunState& state = runState();
-  const RunSettings& settings = runSettings;
+}  // namespace
+
+void setupRun(const char* parameterFile, Run& run) {
+  if (readParameterFile(parameterFile, run.parameters) == 0) {
+    throw RunError::fatal("Error in parameter file");
+  }
+
+  std::unique_ptr<FileDescription, DescriptionDeleter> bathymetry(descriptionNew(2));
+  if (bathymetry == nullptr) throw RunError::fatal("Unable to allocate memory");
+  // A file that cannot be read leaves the description at its creation values,
+  // which the validation below rejects.
+  bathymetryRead(run.parameters.inputFiles.FileName, *bathymetry, 1, run.state.bathymetryGrid);
+  deriveSettings(run.parameters, *bathymetry, run.settings);
+  run.state.landValue = run.settings.landValue;
+
+  char message[1024];
+  if (checkRunSettings(run.parameters, run.settings, message, sizeof message) == 0) {
+    throw RunError::fatal(message);
+  }
+  // The result replaces whatever file has its name: one of the run's own files
+  // is refused before anything is computed.
+  if (resultIsOwnFile(run.parameters, parameterFile)) {
+    std::snprintf(message, sizeof message, "ERROR: result file %s is one of the run's own files",
+                  run.parameters.outputData.FileName);
+    throw RunError::fatal(message);
+  }
+
+  // One projection object serves the whole run: its conversions do not depend
+  // on the position it was placed at.
+  const double longitude = bathymetry->axes[1].origin;
+  const double latitude = bathymetry->axes[2].origin;
+  try {
+    run.cartography = std::make_unique<Cartography>(run.settings.projection, longitude, latitude,
+                                                    run.settings.orientation);
+  } catch (const std::runtime_error&) {
+    throw RunError::fatal("Unable to initialize geo. system");
+  }
+  run.cartography->geoToProj(longitude, latitude, &run.settings.xOrigo, &run.settings.yOrigo);
+}
+
+int runPhases(Run& run, RunSummary* summary) {
+  RunState& state = run.state;
+  const RunContext context = contextOf(run);
+  const RunSettings& settings = run.settings;
+  const RunParameters& parameters = run.parameters;
   std::int32_t lastObs = -1, jOff = 0, kOff = 0, lOff = 0;
 
   progressStatus("Scanning data ...");
   ObservationTally tally;
-  dataScan(state, settings, runParameters.inputFiles.FileName, &lastObs, &jOff, &kOff, &lOff,
-           &tally);
+  dataScan(state, context, parameters.inputFiles.FileName, &lastObs, &jOff, &kOff, &lOff, &tally);
   progressStatus("Scanning bathymetry ...");
   bathymetryScan(jOff, kOff, lOff, state, settings);
   progressStatus("Initialising ...");
   if (settings.Analysis == 0) {
-    objectiveAnalysis(lastObs, jOff, kOff, lOff, state, settings);
+    objectiveAnalysis(lastObs, jOff, kOff, lOff, state, context);
   } else {
-    interp(lastObs, jOff, kOff, lOff, state, settings);
+    interp(lastObs, jOff, kOff, lOff, state, context);
   }
   // Over several processes the levels meet only in the result file.
-  if (rankCount() > 1) return writeRankedResult(invocation, state, runParameters, settings, tally, summary);
+  if (rankCount() > 1) {
+    return writeRankedResult(run.invocation, state, parameters, settings, tally, summary);
+  }
   glo2loc(jOff, kOff, lOff, state, settings);
   if (summary != nullptr) {
-    summary->resultPath = runParameters.outputData.FileName;
+    summary->resultPath = parameters.outputData.FileName;
     summary->observations = tally;
     countResultNodes(state.bathymetryGrid, state.landValue, settings, state.localValues, summary);
   }
   progressStatus("Saving data ...");
   const TextAttributes attributes = resultGlobalAttributes(
-      runParameters, invocation.commandLine, KARNET_VERSION, resultTimestamp());
-  return resultWrite(runParameters.outputData.FileName, *state.resultDescription, 1,
-                     runParameters.outputData.ItemType, state.localValues, settings.projection,
+      parameters, run.invocation.commandLine, KARNET_VERSION, resultTimestamp());
+  return resultWrite(parameters.outputData.FileName, *state.resultDescription, 1,
+                     parameters.outputData.ItemType, state.localValues, settings.projection,
                      &attributes);
 }
 
@@ -69,21 +120,37 @@ void freeRunArrays(RunState& state) {
   state.resultDescription = nullptr;
 }
 
-void runDriver(const RunInvocation& invocation) {
+void runDriver(Run& run) {
   installSignalHandlers();
-  runInitialise(runState(), runSettings);
+  runInitialise(run.state, contextOf(run));
   RunSummary summary;
-  const int written = runPhases(invocation, &summary);
+  const int written = runPhases(run, &summary);
   // A run whose result could not be written has not produced what it was for;
   // every process of the run ends as the one that wrote it.
   const std::int32_t failed = ranksAgreeOnEnd(written == 0 ? 1 : -1);
-  if (failed >= 0) {
-    logWrite("\nERROR while writing result file\n");
-    exitRun(failed);
-  }
-  freeRunArrays(runState());
+  if (failed >= 0) throw RunError::logged("\nERROR while writing result file\n", failed);
+  freeRunArrays(run.state);
   restoreSignalHandlers();
-  if (rankLeads()) printRunSummary(stderr, summary, invocation.quiet);
+  if (rankLeads()) printRunSummary(stderr, summary, run.invocation.quiet);
+}
+
+void runProgram(const char* parameterFile, const RunInvocation& invocation) {
+  try {
+    // Lives until the process ends: exitRun leaves without unwinding.
+    static Run run;
+    run.invocation = invocation;
+    if (run.invocation.threads < 1) run.invocation.threads = 1;
+    setupRun(parameterFile, run);
+    runDriver(run);
+  } catch (const RunError& error) {
+    endRun(error);
+  } catch (const std::bad_alloc&) {
+    endRun(RunError::memory("Memory exhausted\n"));
+  } catch (const std::exception& error) {
+    // Nothing below throws anything else on purpose; should it happen, the run
+    // still ends through its report rather than by an abort.
+    endRun(RunError::fatal(std::string("ERROR: ") + error.what()));
+  }
   exitRun(0);
 }
 

@@ -3,10 +3,12 @@
 
 #include <sys/time.h>
 
+#include <atomic>
 #include <csignal>
 #include <cstdint>
 
 #include "control/termination.h"
+#include "support/run_error.h"
 
 namespace karnet {
 namespace {
@@ -38,8 +40,10 @@ SavedHandlers saved;
 alignas(16) unsigned char alternateStack[kAlternateStackSize];
 
 // The interrupt waiting for its fatal path, and whether that path has started.
-volatile std::sig_atomic_t pendingSignal = 0;
-volatile std::sig_atomic_t pendingClaimed = 0;
+// Lock-free atomics: the handlers may run on any of the run's threads.
+std::atomic<int> pendingSignal{0};
+std::atomic<int> pendingClaimed{0};
+static_assert(std::atomic<int>::is_always_lock_free);
 
 const char* messageFor(int number) {
   for (const HandledSignal& handled : kHandledSignals) {
@@ -59,8 +63,7 @@ void faultHandler(int number) { fatalErrorInSignal(messageFor(number), number); 
 // Ends the run from the signal context for the pending interrupt, unless the
 // main code has already taken it up or the run is ending anyway.
 void endForPendingNow() {
-  if (pendingClaimed != 0 || runEnding()) return;
-  pendingClaimed = 1;
+  if (runEnding() || pendingClaimed.exchange(1) != 0) return;
   const int number = pendingSignal;
   fatalErrorInSignal(messageFor(number), number);
 }
@@ -124,11 +127,10 @@ void restoreSignalHandlers() {
 }
 
 void handlePendingSignal() {
-  if (pendingSignal == 0 || pendingClaimed != 0) return;
-  pendingClaimed = 1;
+  if (pendingSignal == 0 || pendingClaimed.exchange(1) != 0) return;
   setAlarm(0);
   const std::int32_t number = pendingSignal;
-  fatalError(messageFor(number), &number);
+  throw RunError::fatal(messageFor(number), number);
 }
 
 }  // namespace karnet

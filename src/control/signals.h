@@ -9,16 +9,19 @@ namespace karnet {
 //
 // SIGFPE, SIGILL and SIGSEGV end the run from the handler itself (the faulting
 // code cannot go on). SIGINT and SIGTERM only record the signal: the fatal path
-// runs outside the signal context at the next handlePendingSignal, which the
-// computing loops reach through progressCheckCancel. Should the program not get
+// runs outside the signal context: the next handlePendingSignal, which the
+// computing loops reach through progressCheckCancel, throws the signal's
+// RunError for the run driver. Should the program not get
 // there within about a second (a long read or write), a one-shot SIGALRM timer
 // armed by the handler runs the fatal path from the signal context instead. A
 // second SIGINT or SIGTERM while one is pending does the same at once.
 void installSignalHandlers();
-// Runs a still pending interrupt first, then puts the saved handlers back.
+// Puts the saved handlers back; throws the RunError of a still pending
+// interrupt first.
 void restoreSignalHandlers();
 
-// Runs the fatal path for an interrupt that a handler recorded, if any.
+// Throws RunError::fatal with the message and number of an interrupt that a
+// handler recorded, if any (once).
 void handlePendingSignal();
 
 }  // namespace karnet

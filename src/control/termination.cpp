@@ -18,6 +18,7 @@ namespace karnet {
 namespace {
 
 constexpr int kErrorStyle = 16;
+constexpr int kYesNoStyle = 4;
 constexpr std::size_t kNameSize = 260;
 constexpr std::size_t kLineSize = 256;
 
@@ -87,6 +88,30 @@ void fatalError(const char* message, const std::int32_t* exitCode) {
   reportFatal(message);
   finishRun(code, false);
   std::exit(code);
+}
+
+void endRun(const RunError& error) {
+  if (!error.notice().empty()) {
+    std::fputs(error.notice().c_str(), stderr);
+    std::fflush(stderr);
+  }
+  switch (error.kind()) {
+    case RunError::Kind::kFatal: {
+      const std::int32_t code = error.exitCode();
+      fatalError(error.message().c_str(), &code);
+    }
+    case RunError::Kind::kLogged:
+      logWrite(error.message().c_str());
+      break;
+    case RunError::Kind::kMemory:
+      std::fputs(error.message().c_str(), stderr);
+      std::fflush(stderr);
+      break;
+    case RunError::Kind::kCancelled:
+      apvMessage(error.message().c_str(), "", kYesNoStyle);
+      break;
+  }
+  exitRun(error.exitCode());
 }
 
 void fatalErrorInSignal(const char* message, std::int32_t exitCode) {

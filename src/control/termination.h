@@ -4,6 +4,8 @@
 #include <cstddef>
 #include <cstdint>
 
+#include "support/run_error.h"
+
 namespace karnet {
 
 // The RUN TIME INFORMATION block: "Successful" for code 0, else "Abnormal".
@@ -15,6 +17,11 @@ void runTimeReport(std::int32_t completionCode);
 // Log the message, show it unless buildmode=nigth (or H84 unset), then
 // exitRun with *exitCode, or 1 when exitCode is null.
 [[noreturn]] void fatalError(const char* message, const std::int32_t* exitCode = nullptr);
+
+// Ends the run for an error that reached the run driver: the error's log
+// text, message or stderr text, then exitRun with its code. Only the driver
+// (and the program's entry) calls it.
+[[noreturn]] void endRun(const RunError& error);
 
 // The same fatal path for use inside a signal handler: nothing but the log
 // lines, the message, the terminal restore and _exit(exitCode), so that no

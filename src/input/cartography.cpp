@@ -233,46 +233,4 @@ std::string Cartography::wkt() const {
   return text != nullptr ? std::string(text) : std::string();
 }
 
-namespace {
-
-// The run's cartography object; null until created and after a failed creation.
-std::unique_ptr<Cartography> runCartography;
-
-}  // namespace
-
-int cartographyCreate(double longitude, double latitude, double orientation,
-                      const char* projection) {
-  try {
-    runCartography.reset();
-    if (projection == nullptr) return -1;
-    runCartography = std::make_unique<Cartography>(projection, longitude, latitude, orientation);
-    return 0;
-  } catch (...) {
-    return -1;
-  }
-}
-
-// Without an object (none created, or the last creation failed) the results
-// are not-a-number rather than a crash.
-void cartographyGeoToProj(double longitude, double latitude, double* x, double* y) {
-  if (runCartography == nullptr) {
-    *x = *y = std::numeric_limits<double>::quiet_NaN();
-    return;
-  }
-  runCartography->geoToProj(longitude, latitude, x, y);
-}
-
-void cartographyProjToGeo(double x, double y, double* longitude, double* latitude) {
-  if (runCartography == nullptr) {
-    *longitude = *latitude = std::numeric_limits<double>::quiet_NaN();
-    return;
-  }
-  runCartography->projToGeo(x, y, longitude, latitude);
-}
-
-double cartographyConvergence(double longitude, double latitude) {
-  if (runCartography == nullptr) return std::numeric_limits<double>::quiet_NaN();
-  return runCartography->convergence(longitude, latitude);
-}
-
 }  // namespace karnet

@@ -33,14 +33,6 @@ class Cartography {
   std::unique_ptr<Impl> impl_;
 };
 
-// The process-wide cartography object of a run.
-// 0 on success, -1 when the object cannot be made (the old one is gone then).
-int cartographyCreate(double longitude, double latitude, double orientation,
-                      const char* projection);
-void cartographyGeoToProj(double longitude, double latitude, double* x, double* y);
-void cartographyProjToGeo(double x, double y, double* longitude, double* latitude);
-double cartographyConvergence(double longitude, double latitude);
-
 }  // namespace karnet
 
 #endif  // KARNET_INPUT_CARTOGRAPHY_H_

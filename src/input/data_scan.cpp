@@ -12,25 +12,26 @@
 #include "control/log.h"
 #include "control/progress.h"
 #include "control/ranks.h"
-#include "control/termination.h"
 #include "input/bathymetry_read.h"
 #include "input/cartography.h"
 #include "input/level_share.h"
 #include "input/observation_line.h"
 #include "params/run_settings.h"
+#include "state/run_context.h"
 #include "state/run_state.h"
 #include "support/file_description.h"
 #include "support/memory_limit.h"
+#include "support/run_error.h"
 
 namespace karnet {
 namespace {
 
 constexpr std::int64_t kMaxCount = 2147483647;
 
-[[noreturn]] void stopScan(RunState& state, const char* message) {
-  logWrite(message);
+// Data scanning gives back everything allocated so far before the run stops.
+[[noreturn]] void stopScan(RunState& state, const std::string& message) {
   releaseAll(state);
-  exitRun(1);
+  throw RunError::logged(message);
 }
 
 // The grid frame: projected coordinates turned by the grid rotation.
@@ -51,9 +52,10 @@ struct Extent {
 };
 
 // Extents of the bathymetry nodes in the grid frame.
-void bathymetryExtents(const FileDescription& d, const Rotation& r, Extent& x, Extent& y) {
+void bathymetryExtents(const FileDescription& d, const Cartography& map, const Rotation& r,
+                       Extent& x, Extent& y) {
   double x0 = 0, y0 = 0;
-  cartographyGeoToProj(d.axes[1].origin, d.axes[2].origin, &x0, &y0);
+  map.geoToProj(d.axes[1].origin, d.axes[2].origin, &x0, &y0);
   const AxisDescription& ax = d.axes[1];
   const AxisDescription& ay = d.axes[2];
   const std::int32_t iFirst = static_cast<std::int32_t>(ax.start);
@@ -74,13 +76,11 @@ void bathymetryExtents(const FileDescription& d, const Rotation& r, Extent& x, E
 // The log keeps its fixed lines; the user also sees the file, the line and why.
 [[noreturn]] void waterFileError(RunState& state, const char* fileName, std::int64_t lineNumber,
                                  const std::string& reason) {
-  std::fprintf(stderr, "karnet: %s:%lld: %s\n", fileName, static_cast<long long>(lineNumber),
-               reason.c_str());
-  std::fflush(stderr);
-  logWrite("\nERROR while reading water file\n");
-  logPrintf("      line number: %lld\n", static_cast<long long>(lineNumber));
   releaseAll(state);
-  exitRun(1);
+  throw RunError::logged("\nERROR while reading water file\n      line number: " +
+                         std::to_string(lineNumber) + "\n")
+      .withNotice("karnet: " + std::string(fileName) + ":" + std::to_string(lineNumber) + ": " +
+                  reason + "\n");
 }
 
 // Reads every observation line, turned into the grid frame. Returns the count.
@@ -198,12 +198,16 @@ BasicAxis layBasicAxis(double dataMin, double dataMax, double localFirst, float 
   return a;
 }
 
-void dataScan(RunState& state, const RunSettings& s, const char* bathymetryFile,
+void dataScan(RunState& state, const RunContext& context, const char* bathymetryFile,
               std::int32_t* lastObs, std::int32_t* jOff, std::int32_t* kOff,
               std::int32_t* lOff, ObservationTally* tally) {
+  const RunSettings& s = context.settings;
+  Report& report = context.report;
+  if (context.cartography == nullptr) stopScan(state, "\nUnable to initialize geo. system\n");
+  const Cartography& map = *context.cartography;
   double longitude = 0, latitude = 0;
-  cartographyProjToGeo(s.xOrigo, s.yOrigo, &longitude, &latitude);
-  const double gamma = cartographyConvergence(longitude, latitude);
+  map.projToGeo(s.xOrigo, s.yOrigo, &longitude, &latitude);
+  const double gamma = map.convergence(longitude, latitude);
   const double theta = (s.orientation - gamma) * (-3.141592654) / 180;
   Rotation r;
   r.co = std::cos(theta);
@@ -222,7 +226,7 @@ void dataScan(RunState& state, const RunSettings& s, const char* bathymetryFile,
   const double bedMin = static_cast<double>(bathymetry->items[1].values[1]);
   constexpr double kInf = std::numeric_limits<double>::infinity();
   Extent bx{kInf, -kInf}, by{kInf, -kInf};
-  bathymetryExtents(*bathymetry, r, bx, by);
+  bathymetryExtents(*bathymetry, map, r, bx, by);
   descriptionFree(bathymetry);
 
   progressStatus("Reading data file ...");
@@ -234,20 +238,20 @@ void dataScan(RunState& state, const RunSettings& s, const char* bathymetryFile,
   const double zMin = std::min(obs[2].min, bedMin), zMax = std::max(obs[2].max, 0.0);
 
   const BasicAxis ax = layBasicAxis(xMin, xMax, xg0, s.dx, s.j0, s.jx);
-  if (ax.originWarning) logWrite("\nWARNING : X-origo outside of digitized data\n");
+  if (ax.originWarning) report.write("\nWARNING : X-origo outside of digitized data\n");
   const BasicAxis ay = layBasicAxis(yMin, yMax, yg0, s.dy, s.k0, s.kx);
-  if (ay.originWarning) logWrite("\nWARNING : Y-origo outside of digitized data\n");
+  if (ay.originWarning) report.write("\nWARNING : Y-origo outside of digitized data\n");
   const BasicAxis az = layBasicAxis(zMin, zMax, zg0, s.dz, s.l0, s.lx);
-  if (az.originWarning) logWrite("\nWARNING : Z-origo outside of digitized data\n");
+  if (az.originWarning) report.write("\nWARNING : Z-origo outside of digitized data\n");
 
   if (xg0 + static_cast<double>(static_cast<float>(s.jx - s.j0) * s.dx) > xMax) {
-    logWrite("\nWARNING: X-upper bound outside of digitized data\n");
+    report.write("\nWARNING: X-upper bound outside of digitized data\n");
   }
   if (yg0 + static_cast<double>(static_cast<float>(s.kx - s.k0) * s.dy) > yMax) {
-    logWrite("\nWARNING: Y-upper bound outside of digitized data\n");
+    report.write("\nWARNING: Y-upper bound outside of digitized data\n");
   }
   if (static_cast<double>(static_cast<float>(s.lx - s.l0) * s.dz) > zMax) {
-    logWrite("\nWARNING: Z-upper bound outside of digitized data\n");
+    report.write("\nWARNING: Z-upper bound outside of digitized data\n");
   }
 
   // Far-off observations can ask for a basic grid beyond what the grid records
@@ -274,12 +278,14 @@ void dataScan(RunState& state, const RunSettings& s, const char* bathymetryFile,
   const std::uint64_t needed = 2 * volume + 2 * layer + held;
   const std::uint64_t limit = memoryLimitBytes();
   if (needed > limit) {
-    logPrintf("\nBasic grid of %lld x %lld x %lld nodes needs %llu bytes with the result grid"
-              " and the observations; at most %llu bytes of memory are available\n",
-              static_cast<long long>(ax.count), static_cast<long long>(ay.count),
-              static_cast<long long>(az.count), static_cast<unsigned long long>(needed),
-              static_cast<unsigned long long>(limit));
-    stopScan(state, "\nUnable to allocate memory \n");
+    char line[256];
+    std::snprintf(line, sizeof line,
+                  "\nBasic grid of %lld x %lld x %lld nodes needs %llu bytes with the result grid"
+                  " and the observations; at most %llu bytes of memory are available\n",
+                  static_cast<long long>(ax.count), static_cast<long long>(ay.count),
+                  static_cast<long long>(az.count), static_cast<unsigned long long>(needed),
+                  static_cast<unsigned long long>(limit));
+    stopScan(state, std::string(line) + "\nUnable to allocate memory \n");
   }
 
   *lastObs = static_cast<std::int32_t>(count - 1);
@@ -315,18 +321,12 @@ void dataScan(RunState& state, const RunSettings& s, const char* bathymetryFile,
     g->total = std::int64_t{nj} * nk * share.count;
     if (g->total > 0) grid3DAlloc(*g);
   }
-  for (FloatGrid2D* g : {&state.layerBathymetry, &state.layerValues}) {
-    *g = FloatGrid2D{};
-    g->nj = nj;
-    g->nk = nk;
-    grid2DAlloc(*g);
-  }
 
-  logWrite("\nBasic grid parameters:\n");
-  logWrite("\n");
-  logPrintf("Number of x-nodes: %4d\n", nj);
-  logPrintf("Number of y-nodes: %4d\n", nk);
-  logPrintf("Number of z-nodes: %4d\n", nl);
+  report.write("\nBasic grid parameters:\n");
+  report.write("\n");
+  report.printf("Number of x-nodes: %4d\n", nj);
+  report.printf("Number of y-nodes: %4d\n", nk);
+  report.printf("Number of z-nodes: %4d\n", nl);
 }
 
 }  // namespace karnet

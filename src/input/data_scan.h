@@ -7,7 +7,7 @@
 namespace karnet {
 
 struct RunState;
-struct RunSettings;
+struct RunContext;
 
 // Where the observations of a run lie, counted while data scanning converts
 // them to basic-grid units. Every observation read falls in exactly one of
@@ -25,9 +25,10 @@ struct ObservationTally {
 // basic-grid units, allocates the basic-grid fields and logs the basic grid.
 // Hands back the last observation's index and the basic node of the local
 // grid's first node, and counts where the observations lie (when tally is
-// given). Ends the run itself on failure; a bad observation line is also
-// reported as "karnet: FILE:LINE: REASON" on stderr.
-void dataScan(RunState& state, const RunSettings& settings, const char* bathymetryFile,
+// given). On failure releases the run's arrays (releaseAll) and throws a
+// RunError for the log; that of a bad observation line also carries
+// "karnet: FILE:LINE: REASON" for stderr.
+void dataScan(RunState& state, const RunContext& context, const char* bathymetryFile,
               std::int32_t* lastObs, std::int32_t* jOff, std::int32_t* kOff,
               std::int32_t* lOff, ObservationTally* tally = nullptr);
 

@@ -2,22 +2,29 @@
 
 #include <cstdio>
 #include <cstring>
+#include <string>
 
 #include "control/log.h"
 #include "control/progress.h"
 #include "control/ranks.h"
-#include "control/run_driver.h"
 #include "input/cartography.h"
 #include "params/run_settings.h"
+#include "state/run_context.h"
 #include "state/run_state.h"
 #include "support/date_time.h"
 #include "support/file_description.h"
 #include "support/memory_limit.h"
+#include "support/run_error.h"
 
 namespace karnet {
 namespace {
 
 constexpr std::int64_t kMaxElements = 2147483647;
+
+// The failures of run initialisation reach the log only, as "\nERROR: %s\n".
+[[noreturn]] void initialisationError(const char* message) {
+  throw RunError::logged(std::string("\nERROR: ") + message + "\n");
+}
 
 // Number of lines: every line feed ends one, and a last line without a line
 // feed counts too. Asks for a cancel at every thousandth line feed.
@@ -75,44 +82,45 @@ void requireMemory(std::int64_t nj, std::int64_t nk, std::int64_t nl, std::int64
   const std::uint64_t needed = grid > UINT64_MAX - scatter ? UINT64_MAX : grid + scatter;
   const std::uint64_t limit = memoryLimitBytes();
   if (needed <= limit) return;
-  logPrintf("\nResult grid of %lld x %lld x %lld nodes and %lld observations need %llu bytes;"
-            " at most %llu bytes of memory are available\n",
-            static_cast<long long>(nj), static_cast<long long>(nk), static_cast<long long>(nl),
-            static_cast<long long>(observations), static_cast<unsigned long long>(needed),
-            static_cast<unsigned long long>(limit));
-  reportInitError(-1, "Unable to allocate memory");
+  char line[256];
+  std::snprintf(line, sizeof line,
+                "\nResult grid of %lld x %lld x %lld nodes and %lld observations need %llu bytes;"
+                " at most %llu bytes of memory are available\n",
+                static_cast<long long>(nj), static_cast<long long>(nk), static_cast<long long>(nl),
+                static_cast<long long>(observations), static_cast<unsigned long long>(needed),
+                static_cast<unsigned long long>(limit));
+  throw RunError::logged(std::string(line) + "\nERROR: Unable to allocate memory\n");
 }
 
 }  // namespace
 
-void runInitialise(RunState& state, const RunSettings& s) {
+void runInitialise(RunState& state, const RunContext& context) {
+  const RunSettings& s = context.settings;
   // Spans that do not fit the grid records' 32-bit counts cannot be allocated.
   const std::int64_t nj = std::int64_t{s.jx} - s.j0 + 1;
   const std::int64_t nk = std::int64_t{s.kx} - s.k0 + 1;
   const std::int64_t nl = std::int64_t{s.lx} - s.l0 + 1;
   if (nj > kMaxElements || nk > kMaxElements || nl > kMaxElements ||
       nj * nk > kMaxElements || nj * nk * nl > kMaxElements) {
-    reportInitError(-1, "Unable to allocate memory");
+    initialisationError("Unable to allocate memory");
   }
   progressStartGrid(s.jx - s.j0, s.kx - s.k0, s.lx - s.l0);
   progressStatus("Initializing ...");
 
   state.observationFile = std::fopen(s.dataFileName, "rb");
-  if (state.observationFile == nullptr) reportInitError(-1, "unable to open ASCII data file");
+  if (state.observationFile == nullptr) initialisationError("unable to open ASCII data file");
   const std::int64_t count = countLines(state.observationFile);
   if (count <= kMaxElements) requireMemory(nj, nk, nl, count);
-  if (count > kMaxElements || !scatterDataAlloc(state.scatter, count)) reportInitError(-1, "Unable to allocate memory");
+  if (count > kMaxElements || !scatterDataAlloc(state.scatter, count)) initialisationError("Unable to allocate memory");
 
   state.resultDescription = descriptionNew(3);
-  if (state.resultDescription == nullptr) reportInitError(-1, "Unable to allocate memory");
+  if (state.resultDescription == nullptr) initialisationError("Unable to allocate memory");
   FileDescription& d = *state.resultDescription;
   fillResultHeader(d, s);
 
-  if (cartographyCreate(0.0, 0.0, s.orientation, s.projection) != 0) {
-    reportInitError(-1, "Unable to initialize geo. system");
-  }
+  if (context.cartography == nullptr) initialisationError("Unable to initialize geo. system");
   double longitude = 0, latitude = 0;
-  cartographyProjToGeo(s.xOrigo, s.yOrigo, &longitude, &latitude);
+  context.cartography->projToGeo(s.xOrigo, s.yOrigo, &longitude, &latitude);
 
   setAxis(d.axes[1], s.j0, s.dx, s.jx - s.j0, longitude);
   setAxis(d.axes[2], s.k0, s.dy, s.kx - s.k0, latitude);

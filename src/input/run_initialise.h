@@ -4,12 +4,13 @@
 namespace karnet {
 
 struct RunState;
-struct RunSettings;
+struct RunContext;
 
 // Opens and counts the observation file, allocates the observation arrays,
-// builds the result description, places the map projection at (0, 0) and
-// allocates the local result grid. Ends the run through reportInitError on failure.
-void runInitialise(RunState& state, const RunSettings& settings);
+// builds the result description (its origin through the run's map projection)
+// and allocates the local result grid. Throws a RunError for the log
+// ("\nERROR: ...\n") on failure.
+void runInitialise(RunState& state, const RunContext& context);
 
 }  // namespace karnet
 

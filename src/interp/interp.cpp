@@ -1,4 +1,10 @@
 // Bilinear / distance-weighted analysis of the basic grid, layer by layer.
+//
+// Layers are independent of each other: each reads and writes only its own
+// level of the basic grid. They are shared out over threads, and the rows of a
+// layer over the threads of a layer's team; every estimate reads only the copy
+// of its layer made before the layer's pass, so neither the number of threads
+// nor the order of the work changes a bit of the result.
 #include "interp/interp.h"
 
 #include <algorithm>
@@ -6,48 +12,76 @@
 #include <cmath>
 #include <cstdint>
 #include <cstring>
+#include <exception>
+#include <optional>
+#include <vector>
 
 #include "control/log.h"
 #include "control/progress.h"
 #include "control/ranks.h"
+#include "control/threads.h"
 #include "interp/bilin.h"
 #include "interp/meanw.h"
 #include "interp/node_tests.h"
 #include "interp/search.h"
 #include "interp/setadj.h"
 #include "interp/smooth_layer.h"
+#include "state/run_context.h"
 #include "support/float_grid.h"
 
 namespace karnet {
 
 namespace {
 
-// Tallies of one call, over all layers.
+// Tallies of one layer; a call's totals are summed in layer order.
 struct InterpolationCounts {
   std::int64_t bilinear = 0;
   std::int64_t weighted = 0;
   std::int64_t none = 0;
 };
 
-// Working storage of one call: the copy of the layer as it was before its pass
-// (the only data the estimators see), the count table of that copy and the
-// search hints of the walk over it.
-struct InterpWorkspace {
+// Working storage of the thread that analyses a layer: the layer's values and
+// bed, the copy of the values as they were before the layer's pass (the only
+// data the estimators see) and the count table of that copy.
+class LayerWorkspace {
+ public:
+  LayerWorkspace(std::int32_t nj, std::int32_t nk)
+      : size_(static_cast<std::size_t>(nj) * static_cast<std::size_t>(nk)),
+        values_(size_), bed_(size_), scratch_(size_),
+        counts_((static_cast<std::size_t>(nj) + 1) * (static_cast<std::size_t>(nk) + 1)) {
+    values = FloatGrid2D{0, 0, nj, nk, values_.data()};
+    bed = FloatGrid2D{0, 0, nj, nk, bed_.data()};
+    scratch = FloatGrid2D{0, 0, nj, nk, scratch_.data()};
+    index.nj = nj;
+    index.nk = nk;
+    index.counts = counts_.data();
+  }
+  LayerWorkspace(const LayerWorkspace&) = delete;
+  LayerWorkspace& operator=(const LayerWorkspace&) = delete;
+
+  FloatGrid2D values;
+  FloatGrid2D bed;
   FloatGrid2D scratch;
   SearchIndex index;
-  bool indexCurrent = false;
-  SearchHints hints;
+
+ private:
+  std::size_t size_;
+  std::vector<float> values_;
+  std::vector<float> bed_;
+  std::vector<float> scratch_;
+  std::vector<std::uint32_t> counts_;
 };
 
 // Estimate for the empty wet node (j, k) from the data of the scratch layer.
-float estimateNode(std::int32_t j, std::int32_t k, InterpWorkspace& ws, float reach,
-                   double deleteValue, InterpolationCounts& counts) {
+// hints belong to the calling thread.
+float estimateNode(std::int32_t j, std::int32_t k, const LayerWorkspace& ws, SearchHints& hints,
+                   float reach, double deleteValue, InterpolationCounts& counts) {
   std::int32_t jHit[kHitListSize];
   std::int32_t kHit[kHitListSize];
   float f[kHitListSize];
   float w[kHitListSize];
   const FloatGrid2D& data = ws.scratch;
-  const std::int32_t n = search(j, k, data, reach, deleteValue, ws.index, ws.hints, jHit, kHit);
+  const std::int32_t n = search(j, k, data, reach, deleteValue, ws.index, hints, jHit, kHit);
   if (n == 4) {
     for (int i = 1; i <= 4; ++i) f[i] = data.data[std::int64_t{kHit[i]} * data.nj + jHit[i]];
     ++counts.bilinear;
@@ -68,119 +102,180 @@ float estimateNode(std::int32_t j, std::int32_t k, InterpWorkspace& ws, float re
   return meanw(f, w, n);
 }
 
-void writeStatistics(const InterpolationCounts& counts) {
-  logPrintf("\n");
-  logPrintf("-------------------------------------------------\n");
-  logPrintf("Statistics for local grid:\n");
-  logPrintf("\n");
+void writeStatistics(Report& report, const InterpolationCounts& counts) {
+  report.printf("\n");
+  report.printf("-------------------------------------------------\n");
+  report.printf("Statistics for local grid:\n");
+  report.printf("\n");
   // The counts are kept in 64 bits; for any count that fits an int the text is
   // that of "%d".
-  logPrintf("No. of bilinear interpolations          : %" PRId64 "\n", counts.bilinear);
-  logPrintf("No. of distance weighted interpolations : %" PRId64 "\n", counts.weighted);
-  logPrintf("No. of no interpolations                : %" PRId64 "\n", counts.none);
-  logPrintf("-------------------------------------------------\n");
-  logPrintf("\n");
+  report.printf("No. of bilinear interpolations          : %" PRId64 "\n", counts.bilinear);
+  report.printf("No. of distance weighted interpolations : %" PRId64 "\n", counts.weighted);
+  report.printf("No. of no interpolations                : %" PRId64 "\n", counts.none);
+  report.printf("-------------------------------------------------\n");
+  report.printf("\n");
+}
+
+// What every layer of one call shares.
+struct LayerPass {
+  FloatGrid3D* values;
+  const FloatGrid3D* bathymetry;
+  double deleteValue;
+  double landValue;
+  float reach;
+  std::int32_t filterOperations;
+  // The footprint, clipped to the basic grid.
+  std::int64_t jFirst, jLast, kFirst, kLast;
+  int rowThreads;
+  WorkProgress* progress;
+};
+
+// Interpolates, blanks, smooths and writes back basic layer `level`.
+InterpolationCounts interpolateLayer(const LayerPass& pass, std::int32_t level,
+                                     LayerWorkspace& ws) {
+  const std::int64_t nj = ws.values.nj;
+  const std::int64_t layerSize = ws.values.elementCount();
+  const double deleteValue = pass.deleteValue;
+  const double landValue = pass.landValue;
+  grid3DLayerGet(*pass.bathymetry, level, ws.bed);
+  grid3DLayerGet(*pass.values, level, ws.values);
+  std::memcpy(ws.scratch.data, ws.values.data, static_cast<std::size_t>(layerSize) * sizeof(float));
+  searchIndexBuild(ws.index, ws.scratch, deleteValue);
+
+  // Every estimate reads only the scratch copy and writes only its own node,
+  // so the rows of the footprint may go to different threads. Each thread
+  // keeps its own search hints: they change the cost of a search, never its hits.
+  std::int64_t bilinear = 0, weighted = 0, none = 0;
+  WorkProgress& progress = *pass.progress;
+#pragma omp parallel num_threads(pass.rowThreads) if (pass.rowThreads > 1) \
+    reduction(+ : bilinear, weighted, none)
+  {
+    SearchHints hints;
+    InterpolationCounts counts;
+#pragma omp for schedule(dynamic, 4)
+    for (std::int64_t k = pass.kFirst; k <= pass.kLast; ++k) {
+      if (progress.stopped()) continue;
+      float* row = ws.values.data + k * nj;
+      const float* bedRow = ws.bed.data + k * nj;
+      for (std::int64_t j = pass.jFirst; j <= pass.jLast; ++j) {
+        if (!isEmptyCell(row[j], deleteValue) || isDryCell(bedRow[j], landValue)) continue;
+        row[j] = estimateNode(static_cast<std::int32_t>(j), static_cast<std::int32_t>(k), ws,
+                              hints, pass.reach, deleteValue, counts);
+      }
+      progress.poll();
+    }
+    bilinear += counts.bilinear;
+    weighted += counts.weighted;
+    none += counts.none;
+  }
+
+  // Dry nodes of the footprint hold no value, whatever was binned there.
+  const float emptyValue = static_cast<float>(deleteValue);
+  for (std::int64_t k = pass.kFirst; k <= pass.kLast; ++k) {
+    float* row = ws.values.data + k * nj;
+    const float* bedRow = ws.bed.data + k * nj;
+    for (std::int64_t j = pass.jFirst; j <= pass.jLast; ++j) {
+      if (isDryCell(bedRow[j], landValue)) row[j] = emptyValue;
+    }
+  }
+
+  // The smoother reads the neighbours as its own pass has left them: it goes
+  // through the layer in one fixed order, on this thread.
+  for (std::int32_t p = 0; p < pass.filterOperations; ++p) {
+    smoothLayer(ws.values.data, ws.values.nj, ws.values.nk);
+  }
+
+  grid3DLayerPut(*pass.values, level, ws.values);
+  return InterpolationCounts{bilinear, weighted, none};
 }
 
 }  // namespace
 
 void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int32_t lOff,
-            RunState& state, const RunSettings& settings) {
-  InterpWorkspace ws;
-  ws.scratch.nj = state.layerValues.nj;
-  ws.scratch.nk = state.layerValues.nk;
-  grid2DAlloc(ws.scratch);
-  searchIndexAlloc(ws.index, ws.scratch.nj, ws.scratch.nk);
-
+            RunState& state, const RunContext& context) {
+  const RunSettings& settings = context.settings;
   setadj(lastObs, state, settings);
   progressStatus("Interpolating ...");
 
   const std::int64_t spanJ = std::int64_t{settings.jx} - settings.j0;
   const std::int64_t spanK = std::int64_t{settings.kx} - settings.k0;
   const std::int64_t spanL = std::int64_t{settings.lx} - settings.l0;
-  // Only the levels this process holds (all of them when it runs alone), and
-  // progress over them.
-  const LevelRange held = state.heldSteps(lOff, spanL + 1);
-  progressStart(spanK * spanJ * (held.count > 0 ? held.count - 1 : 0));
-  std::int64_t done = 0;
-  InterpolationCounts counts;
 
   FloatGrid3D& values = state.basicValues;
   const FloatGrid3D& bathymetry = state.basicBathymetry;
-  FloatGrid2D& layerValues = state.layerValues;
-  FloatGrid2D& layerBathymetry = state.layerBathymetry;
-  const double deleteValue = state.deleteValue();
-  const float emptyValue = static_cast<float>(deleteValue);
-  const double landValue = state.landValue;
-  const float reach = searchReach(settings);
+  const std::int32_t nj = values.nj;
+  const std::int32_t nk = values.nk;
 
-  const std::int64_t nj = layerValues.nj;
-  const std::int64_t nk = layerValues.nk;
-  const std::int64_t layerSize = nj * nk;
+  LayerPass pass{};
+  pass.values = &values;
+  pass.bathymetry = &bathymetry;
+  pass.deleteValue = state.deleteValue();
+  pass.landValue = state.landValue;
+  pass.reach = searchReach(settings);
+  pass.filterOperations = settings.FilterOperations;
   // The local footprint, jOff .. jOff + spanJ by kOff .. kOff + spanK; data
   // scanning lays it inside the basic grid, and it is never walked outside.
-  const std::int64_t jFirst = std::max<std::int64_t>(jOff, 0);
-  const std::int64_t jLast = std::min<std::int64_t>(jOff + spanJ, nj - 1);
-  const std::int64_t kFirst = std::max<std::int64_t>(kOff, 0);
-  const std::int64_t kLast = std::min<std::int64_t>(kOff + spanK, nk - 1);
+  pass.jFirst = std::max<std::int64_t>(jOff, 0);
+  pass.jLast = std::min<std::int64_t>(jOff + spanJ, std::int64_t{nj} - 1);
+  pass.kFirst = std::max<std::int64_t>(kOff, 0);
+  pass.kLast = std::min<std::int64_t>(kOff + spanK, std::int64_t{nk} - 1);
 
-  for (std::int64_t s = held.first; s < held.end(); ++s) {
-    progressReport(done);
-    done += spanK * spanJ;
-    const std::int64_t lb = lOff + s;
-    // Only the levels this process holds (all of them when it runs alone).
-    if (lb < values.l0 || lb >= values.l0 + values.nl || lb < bathymetry.l0 ||
-        lb >= bathymetry.l0 + bathymetry.nl || layerSize != values.layerSize() ||
-        layerSize != bathymetry.layerSize()) {
-      continue;
-    }
+  // One work unit per footprint node of a layer (as the nodes less one per
+  // axis were counted before, so a layer's share stays the same).
+  const std::int64_t layerUnits = spanK * spanJ;
+  // Only the levels this process holds (all of them when it runs alone), and
+  // progress over them.
+  const LevelRange held = state.heldSteps(lOff, spanL + 1);
+  WorkProgress progress(layerUnits * (held.count > 0 ? held.count - 1 : 0));
+  pass.progress = &progress;
 
-    const std::int32_t level = static_cast<std::int32_t>(lb);
-    grid3DLayerGet(bathymetry, level, layerBathymetry);
-    grid3DLayerGet(values, level, layerValues);
-    std::memcpy(ws.scratch.data, layerValues.data,
-                static_cast<std::size_t>(layerSize) * sizeof(float));
-    ws.indexCurrent = false;
+  const std::int64_t layerCount = spanL + 1;
+  const ThreadShare share = shareThreads(context.threads, std::max<std::int64_t>(held.count, 1));
+  pass.rowThreads = share.rows;
+  allowNestedTeams();
+  std::vector<InterpolationCounts> counts(static_cast<std::size_t>(std::max<std::int64_t>(layerCount, 0)));
 
-    // Every estimate reads only the scratch copy and writes only its own node,
-    // so the footprint may be walked row by row (memory order).
-    for (std::int64_t k = kFirst; k <= kLast; ++k) {
-      float* row = layerValues.data + k * nj;
-      const float* bedRow = layerBathymetry.data + k * nj;
-      for (std::int64_t j = jFirst; j <= jLast; ++j) {
-        if (!isEmptyCell(row[j], deleteValue) || isDryCell(bedRow[j], landValue)) continue;
-        if (!ws.indexCurrent) {
-          searchIndexBuild(ws.index, ws.scratch, deleteValue);
-          ws.indexCurrent = true;
+#pragma omp parallel num_threads(share.layers) if (share.layers > 1)
+  {
+    std::optional<LayerWorkspace> ws;
+#pragma omp for schedule(dynamic, 1) nowait
+    for (std::int64_t s = held.first; s < held.end(); ++s) {
+      if (progress.stopped()) {
+        progress.itemDone();
+        continue;
+      }
+      const std::int64_t lb = lOff + s;
+      const bool inside = lb >= values.l0 && lb < values.l0 + values.nl &&
+                          lb >= bathymetry.l0 && lb < bathymetry.l0 + bathymetry.nl &&
+                          values.layerSize() == bathymetry.layerSize();
+      if (inside) {
+        try {
+          if (!ws.has_value()) ws.emplace(nj, nk);
+          counts[static_cast<std::size_t>(s)] =
+              interpolateLayer(pass, static_cast<std::int32_t>(lb), *ws);
+        } catch (...) {
+          progress.fail(std::current_exception(), s);
         }
-        row[j] = estimateNode(static_cast<std::int32_t>(j), static_cast<std::int32_t>(k), ws,
-                              reach, deleteValue, counts);
       }
+      progress.add(layerUnits);
+      progress.itemDone();
+      progress.poll();
     }
-
-    // Dry nodes of the footprint hold no value, whatever was binned there.
-    for (std::int64_t k = kFirst; k <= kLast; ++k) {
-      float* row = layerValues.data + k * nj;
-      const float* bedRow = layerBathymetry.data + k * nj;
-      for (std::int64_t j = jFirst; j <= jLast; ++j) {
-        if (isDryCell(bedRow[j], landValue)) row[j] = emptyValue;
-      }
-    }
-
-    for (std::int32_t pass = 0; pass < settings.FilterOperations; ++pass) {
-      smoothLayer(layerValues.data, layerValues.nj, layerValues.nk);
-    }
-
-    grid3DLayerPut(values, level, layerValues);
+    progress.watchUntilDone(held.count);
   }
+  progress.finish();
 
+  InterpolationCounts total;
+  for (const InterpolationCounts& layer : counts) {
+    total.bilinear += layer.bilinear;
+    total.weighted += layer.weighted;
+    total.none += layer.none;
+  }
   // The counts of every process's levels.
-  std::int64_t sums[3] = {counts.bilinear, counts.weighted, counts.none};
+  std::int64_t sums[3] = {total.bilinear, total.weighted, total.none};
   ranksSum(sums, 3);
-  counts = InterpolationCounts{sums[0], sums[1], sums[2]};
-  writeStatistics(counts);
-  searchIndexFree(ws.index);
-  grid2DFree(ws.scratch);
+  total = InterpolationCounts{sums[0], sums[1], sums[2]};
+  writeStatistics(context.report, total);
 }
 
 }  // namespace karnet

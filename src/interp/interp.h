@@ -8,14 +8,18 @@
 
 namespace karnet {
 
+struct RunContext;
+
 // Bilinear / distance-weighted analysis: grids the observations (setadj), then
 // fills every empty wet node of the local grid's footprint layer by layer from
 // the quadrant neighbours of the layer as it was before the layer's pass,
 // empties dry footprint nodes, smooths each layer FilterOperations times and
-// writes it back into state.basicValues. Ends with the statistics block in the log.
-// (jOff, kOff, lOff) is the basic node of the local grid's first node.
+// writes it back into state.basicValues. Ends with the statistics block in the
+// context's report. (jOff, kOff, lOff) is the basic node of the local grid's
+// first node. Uses context.threads threads; the result does not depend on them.
+// Throws the RunError of a cancel or an interrupt seen between rows.
 void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int32_t lOff,
-            RunState& state, const RunSettings& settings);
+            RunState& state, const RunContext& context);
 
 }  // namespace karnet
 

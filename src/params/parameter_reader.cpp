@@ -1,4 +1,4 @@
-// Reads the run's parameter file into runParameters and echoes every value to
+// Reads the run's parameter file into a RunParameters record and echoes every value to
 // the log as it goes.
 #include <cstdio>
 #include <cstring>
@@ -10,7 +10,6 @@
 
 namespace karnet {
 
-RunParameters runParameters;
 
 namespace {
 
@@ -168,9 +167,8 @@ int readOutputData(char* fileName, char* title, std::int32_t* itemType) {
   return 1;
 }
 
-int readAllSections() {
+int readAllSections(RunParameters& p) {
   const bool echo = logStream != nullptr;
-  RunParameters& p = runParameters;
 
   target = parTargetByNameNum(parameterFile, kTargetName, 1);
   if (target == nullptr) return noteLibraryFailure();
@@ -243,8 +241,8 @@ int readAllSections() {
 
 }  // namespace
 
-int readParameterFile(const char* path) {
-  runParameters = RunParameters{};
+int readParameterFile(const char* path, RunParameters& parameters) {
+  parameters = RunParameters{};
   failureCause.clear();
   if (!loadParameterFile(path)) {
     // "Can't open NAME" for a file that cannot be read, "NAME:LINE: REASON"
@@ -252,7 +250,7 @@ int readParameterFile(const char* path) {
     logWrite(parErrorTextGlb());
     return 0;
   }
-  const int result = readAllSections();
+  const int result = readAllSections(parameters);
   closeParameterFile();
   if (result == 0) logWrite(failureCause.empty() ? "parameter file incomplete" : failureCause.c_str());
   return result;

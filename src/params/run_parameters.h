@@ -50,12 +50,10 @@ struct RunParameters {
   OutputData outputData;
 };
 
-extern RunParameters runParameters;
-
-// Loads the file, reads the five sections into runParameters and echoes them to
+// Loads the file, reads the five sections into parameters and echoes them to
 // the log. 1 on success; on failure 0, after writing one cause line to the log
 // ("Can't open NAME" or "FILE:LINE: REASON").
-int readParameterFile(const char* path);
+int readParameterFile(const char* path, RunParameters& parameters);
 
 }  // namespace karnet
 

@@ -8,7 +8,8 @@
 namespace karnet {
 
 // Run-wide settings derived from the parameters and the bathymetry header.
-// Written by setupRun, read-only afterwards.
+// Written by run setup, read-only afterwards (the phases get them through the
+// RunContext).
 struct RunSettings {
   std::int32_t j0 = 0, jx = 0, k0 = 0, kx = 0, l0 = 0, lx = 0;
   float dx = 0, dy = 0, dz = 0;
@@ -30,8 +31,6 @@ struct RunSettings {
   char dataFileName[260] = {};
   char projection[1024] = {};
 };
-
-extern RunSettings runSettings;
 
 }  // namespace karnet
 

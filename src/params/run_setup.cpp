@@ -7,19 +7,12 @@
 #include <cstring>
 
 #include "control/command_line.h"
-#include "control/termination.h"
-#include "input/bathymetry_read.h"
-#include "input/cartography.h"
 #include "params/run_parameters.h"
 #include "params/run_settings.h"
-#include "state/run_state.h"
 #include "support/date_time.h"
 #include "support/file_description.h"
 
 namespace karnet {
-
-RunSettings runSettings;
-
 namespace {
 
 void copyText(char* destination, std::size_t size, const char* source) {
@@ -43,21 +36,22 @@ bool sameFile(const char* a, const char* b) {
          first.st_dev == second.st_dev && first.st_ino == second.st_ino;
 }
 
-// The result replaces whatever file has its name: when that is one of the
-// run's own files (an input, the parameter file or the log), the run would
-// destroy it, so it is refused before anything is computed.
-bool resultIsOwnFile(const char* parameterFile) {
-  const char* result = runParameters.outputData.FileName;
+}  // namespace
+
+bool resultIsOwnFile(const RunParameters& parameters, const char* parameterFile) {
+  const char* result = parameters.outputData.FileName;
   char logFileName[kFileNameSize];
   const bool hasLog = makeLogFileName(parameterFile, logFileName) != 0;
-  return sameFile(result, runParameters.inputFiles.FileName) ||
-         sameFile(result, runParameters.inputFiles.DataFileName) ||
+  return sameFile(result, parameters.inputFiles.FileName) ||
+         sameFile(result, parameters.inputFiles.DataFileName) ||
          sameFile(result, parameterFile) || (hasLog && sameFile(result, logFileName));
 }
 
-// Settings that come from the bathymetry header and the parameters.
-void deriveSettings(const FileDescription& bathymetry, RunSettings& s) {
-  const RunParameters& p = runParameters;
+namespace {
+
+}  // namespace
+
+void deriveSettings(const RunParameters& p, const FileDescription& bathymetry, RunSettings& s) {
   s.j0 = static_cast<std::int32_t>(bathymetry.axes[1].start);
   s.jx = s.j0 + bathymetry.axes[1].lastIndex;
   s.k0 = static_cast<std::int32_t>(bathymetry.axes[2].start);
@@ -87,6 +81,8 @@ void deriveSettings(const FileDescription& bathymetry, RunSettings& s) {
   copyText(s.projection, sizeof s.projection, p.inputFiles.Projection);
 }
 
+namespace {
+
 bool calculationParametersValid(const RunSettings& s) {
   if (0 > s.SearchRadius) return false;
   if (0 > s.MaxExtrapolationDistance[0] || 0 > s.MaxExtrapolationDistance[1]) return false;
@@ -101,10 +97,9 @@ bool calculationParametersValid(const RunSettings& s) {
 
 }  // namespace
 
-int checkRunSettings(char* buffer, std::size_t size) {
-  const RunSettings& s = runSettings;
-  if (!readable(runParameters.inputFiles.FileName) ||
-      !readable(runParameters.inputFiles.DataFileName)) {
+int checkRunSettings(const RunParameters& parameters, const RunSettings& s, char* buffer,
+                     std::size_t size) {
+  if (!readable(parameters.inputFiles.FileName) || !readable(parameters.inputFiles.DataFileName)) {
     std::snprintf(buffer, size, "ERROR: in input file selection");
     return 0;
   }
@@ -137,38 +132,6 @@ int checkRunSettings(char* buffer, std::size_t size) {
   if (!calculationParametersValid(s)) {
     std::snprintf(buffer, size, "ERROR: in calculation parameters");
     return 0;
-  }
-  return 1;
-}
-
-int setupRun(const char* parameterFile) {
-  if (readParameterFile(parameterFile) == 0) fatalError("Error in parameter file");
-
-  FileDescription* bathymetry = descriptionNew(2);
-  if (bathymetry == nullptr) fatalError("Unable to allocate memory");
-  // A file that cannot be read leaves the description at its creation values,
-  // which the validation below rejects.
-  bathymetryRead(runParameters.inputFiles.FileName, *bathymetry, 1, runState().bathymetryGrid);
-  deriveSettings(*bathymetry, runSettings);
-  runState().landValue = runSettings.landValue;
-
-  char message[1024];
-  if (checkRunSettings(message, sizeof message) == 0) fatalError(message);
-  if (resultIsOwnFile(parameterFile)) {
-    std::snprintf(message, sizeof message, "ERROR: result file %s is one of the run's own files",
-                  runParameters.outputData.FileName);
-    fatalError(message);
-  }
-
-  const double longitude = bathymetry->axes[1].origin;
-  const double latitude = bathymetry->axes[2].origin;
-  if (cartographyCreate(0.0, 0.0, runSettings.orientation, runSettings.projection) != 0) {
-    fatalError("Unable to initialize geo. system");
-  }
-  cartographyGeoToProj(longitude, latitude, &runSettings.xOrigo, &runSettings.yOrigo);
-  if (cartographyCreate(longitude, latitude, runSettings.orientation, runSettings.projection) !=
-      0) {
-    fatalError("Unable to initialize geo. system");
   }
   return 1;
 }

@@ -10,11 +10,6 @@ double RunState::deleteValue() const {
                                       : static_cast<double>(kDeleteValueFloat);
 }
 
-RunState& runState() {
-  static RunState state;
-  return state;
-}
-
 bool scatterDataAlloc(ScatterData& scatter, std::int64_t count) {
   scatterDataFree(scatter);
   if (count < 0) return false;
@@ -46,8 +41,6 @@ void releaseAll(RunState& state) {
   grid3DFree(state.basicBathymetry);
   grid3DFree(state.basicValues);
   grid3DFree(state.localValues);
-  grid2DFree(state.layerBathymetry);
-  grid2DFree(state.layerValues);
   grid2DFree(state.bathymetryGrid);
   scatterDataFree(state.scatter);
   descriptionFree(state.resultDescription);

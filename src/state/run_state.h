@@ -24,16 +24,15 @@ struct ScatterData {
   std::int64_t capacity = 0;  // entries allocated in each array
 };
 
-// The run-wide arrays and grids that the phases share. One instance lives for
-// the process (runState()); kernels take it by reference so that tests can
-// build their own.
+// The run-wide arrays and grids that the phases share. The run driver owns the
+// run's one instance; kernels take it by reference so that tests can build
+// their own. The work layers of the layer passes are not here: each thread
+// that analyses a layer has its own.
 struct RunState {
   ScatterData scatter;
   FloatGrid2D bathymetryGrid;
   FloatGrid3D basicBathymetry;
   FloatGrid3D basicValues;
-  FloatGrid2D layerBathymetry;
-  FloatGrid2D layerValues;
   FloatGrid3D localValues;
   FileDescription* resultDescription = nullptr;
   std::FILE* observationFile = nullptr;
@@ -70,8 +69,6 @@ struct RunState {
   // Delete value of the result description (the float -1e-30 widened).
   double deleteValue() const;
 };
-
-RunState& runState();
 
 // Releases everything allocated so far (grids, observations, result description);
 // what was never allocated is skipped, nothing is released twice.

@@ -5,8 +5,9 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <mutex>
 
-#include "control/termination.h"
+#include "support/run_error.h"
 
 namespace karnet {
 namespace {
@@ -27,8 +28,10 @@ struct Slot {
 
 // Process-wide table of live blocks. Every slot below firstFree is in use, and
 // no slot at or above slotEnd has ever been used, so both scans stay short while
-// keeping the lowest-free-slot rule.
+// keeping the lowest-free-slot rule. Layers are analysed on several threads at
+// once, so every look at the table holds its lock.
 struct SlotTable {
+  std::mutex lock;
   bool firstUse = true;
   bool fill = false;
   int firstFree = 0;
@@ -41,6 +44,7 @@ SlotTable table;
 }  // namespace
 
 void* checkedAlloc(std::uint64_t size) {
+  const std::lock_guard<std::mutex> guard(table.lock);
   if (table.firstUse) {
     table.firstUse = false;
     for (Slot& slot : table.slots) slot = Slot{nullptr, nullptr, 0};
@@ -73,6 +77,7 @@ void* checkedAlloc(std::uint64_t size) {
 }
 
 void checkedFree(void* p) {
+  const std::lock_guard<std::mutex> guard(table.lock);
   int index = 0;
   if (p != nullptr) {
     while (index < table.slotEnd && table.slots[index].user != p) ++index;
@@ -90,28 +95,29 @@ void checkedFree(void* p) {
 }
 
 void memoryError(int code, const void* p) {
+  char text[96];
   switch (code) {
     case 0:
-      std::fputs("No free slots for memeory allocation\n", stderr);
+      std::snprintf(text, sizeof text, "No free slots for memeory allocation\n");
       break;
     case 1:
-      std::fputs("Memory exhausted\n", stderr);
+      std::snprintf(text, sizeof text, "Memory exhausted\n");
       break;
     case 2:
-      std::fputs("Not a valid pointer\n", stderr);
+      std::snprintf(text, sizeof text, "Not a valid pointer\n");
       break;
     case 3:
-      std::fprintf(stderr, "Memory corrupted (low); ptr = %p\n", const_cast<void*>(p));
+      std::snprintf(text, sizeof text, "Memory corrupted (low); ptr = %p\n", const_cast<void*>(p));
       break;
     case 4:
-      std::fprintf(stderr, "Memory corrupted (high); ptr = %p\n", const_cast<void*>(p));
+      std::snprintf(text, sizeof text, "Memory corrupted (high); ptr = %p\n",
+                    const_cast<void*>(p));
       break;
     default:
-      std::fputs("unknown memory failure\n", stderr);
+      std::snprintf(text, sizeof text, "unknown memory failure\n");
       break;
   }
-  std::fflush(stderr);
-  exitRun(1);
+  throw RunError::memory(text);
 }
 
 }  // namespace karnet

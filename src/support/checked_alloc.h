@@ -8,12 +8,13 @@ namespace karnet {
 // Guarded allocator used for every grid, description and work array.
 // At most 512 blocks are live at a time; every block carries the guard words
 // "1234" right before and "9876" right after its user area (which is aligned to
-// 16 bytes). Failures never return: the message goes to stderr and the run ends
-// with exit code 1 through exitRun.
+// 16 bytes). Failures never return: they throw a RunError whose message the
+// run driver writes to stderr before it ends the run with exit code 1.
+// Safe to call from several threads at once.
 void* checkedAlloc(std::uint64_t size);
 void checkedFree(void* p);
 
-// Writes the message of the error code to stderr and ends the run (code 1).
+// Throws the RunError of the error code (its message for stderr, exit code 1).
 // 0 no free slot, 1 out of memory, 2 unknown pointer, 3 low guard, 4 high guard.
 [[noreturn]] void memoryError(int code, const void* p);
 

@@ -111,7 +111,7 @@ TEST(ObjectiveAnalysis, AnalysesTheFootprintLayersAndWritesTheStatistics) {
   run.setBed(2, 2, -1.5, 1);
   const std::int32_t last = run.observe({{1, 1, 0, 6}, {4, 3, 0, 14}, {2, 2, 0, 9}});
   testing::LogCapture log;
-  objectiveAnalysis(last, 1, 1, 0, run.state, run.settings);
+  objectiveAnalysis(last, 1, 1, 0, run.state, run.context());
   const std::string text = log.text();
   // Five wet footprint nodes estimated on layer 0; six failed on layer 1.
   const std::string rule = "-------------------------------------------------\n";

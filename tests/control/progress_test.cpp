@@ -11,12 +11,17 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cstring>
+#include <stdexcept>
 #include <string>
+#include <thread>
 #include <tuple>
 
 #include "child_process.h"
 #include "control/host.h"
+#include "control/signals.h"
+#include "support/run_error.h"
 
 namespace karnet {
 namespace {
@@ -51,6 +56,79 @@ TEST(ProgressTest, ShowsPercentTimeLeftAndSpeedWithoutDividingByZero) {
   }
   EXPECT_EQ(progressCheckCancel(), 0);  // without a host no cancel is ever asked for
   progressSetClock(nullptr);
+}
+
+TEST(WorkProgressTest, WorkersCountAndTheDrivingThreadShowsAndRethrowsTheFirstError) {
+  progressSetClock([] { return fakeNow; });
+  WorkProgress progress(400);
+  const int before = apvDisplayState().percent;
+  std::thread worker([&progress] {
+    progress.add(100);
+    progress.poll();  // not the driving thread: shows nothing
+  });
+  worker.join();
+  EXPECT_EQ(apvDisplayState().percent, before);
+  progress.add(100);
+  progress.poll();
+  EXPECT_EQ(apvDisplayState().percent, 50);
+  EXPECT_FALSE(progress.stopped());
+  EXPECT_NO_THROW(progress.finish());
+
+  // The error of the earliest layer wins, whatever order the workers fail in.
+  progress.fail(std::make_exception_ptr(std::runtime_error("layer 7")), 7);
+  progress.fail(std::make_exception_ptr(std::runtime_error("layer 3")), 3);
+  progress.fail(std::make_exception_ptr(std::runtime_error("layer 5")), 5);
+  EXPECT_TRUE(progress.stopped());
+  try {
+    progress.finish();
+    ADD_FAILURE() << "no error rethrown";
+  } catch (const std::runtime_error& error) {
+    EXPECT_STREQ(error.what(), "layer 3");
+  }
+  progressSetClock(nullptr);
+}
+
+TEST(WorkProgressTest, AnInterruptSeenByTheDrivingThreadStopsTheWorkers) {
+  ChildOutcome outcome = runChild([] {
+    installSignalHandlers();
+    WorkProgress progress(10);
+    raise(SIGINT);
+    std::thread worker([&progress] { progress.poll(); });
+    worker.join();
+    if (progress.stopped()) _exit(3);  // only the driving thread asks
+    progress.poll();
+    if (!progress.stopped()) _exit(4);
+    try {
+      progress.finish();
+    } catch (const RunError& error) {
+      _exit(error.exitCode() == SIGINT && error.message() == "Control-C send" ? 0 : 5);
+    }
+    _exit(6);
+  });
+  EXPECT_EQ(outcome.exitCode, 0);
+}
+
+TEST(WorkProgressTest, TheDrivingThreadKeepsAskingWhileOthersFinishTheirWork) {
+  // A worker that works until told to stop: only the driving thread, waiting
+  // for it, can see the interrupt and stop it.
+  ChildOutcome outcome = runChild([] {
+    installSignalHandlers();
+    WorkProgress progress(10);
+    std::thread worker([&progress] {
+      while (!progress.stopped()) std::this_thread::sleep_for(std::chrono::milliseconds(1));
+      progress.itemDone();
+    });
+    raise(SIGINT);
+    progress.watchUntilDone(1);
+    worker.join();
+    try {
+      progress.finish();
+    } catch (const RunError& error) {
+      _exit(error.exitCode() == SIGINT ? 0 : 5);
+    }
+    _exit(6);
+  });
+  EXPECT_EQ(outcome.exitCode, 0);
 }
 
 // One phase of work in twenty steps, as the progress layer reports it.

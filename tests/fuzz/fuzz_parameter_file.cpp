@@ -26,8 +26,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   const fuzz::MemoryFile file(data, size);
 
   // The reader as the run calls it.
-  readParameterFile(file.path());
-  const RunParameters& p = runParameters;
+  RunParameters p{};
+  readParameterFile(file.path(), p);
   requireTerminated(p.inputFiles.DataFileName, sizeof p.inputFiles.DataFileName);
   requireTerminated(p.inputFiles.FileName, sizeof p.inputFiles.FileName);
   requireTerminated(p.inputFiles.Projection, sizeof p.inputFiles.Projection);

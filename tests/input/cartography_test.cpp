@@ -112,27 +112,7 @@ TEST(CartographyTest, RejectedTexts) {
   for (const char* text : texts) {
     SCOPED_TRACE(text);
     EXPECT_THROW(Cartography(text, 0, 0, 0), std::runtime_error);
-    EXPECT_EQ(cartographyCreate(0, 0, 0, text), -1);
   }
-  EXPECT_EQ(cartographyCreate(0, 0, 0, nullptr), -1);
-}
-
-TEST(CartographyTest, RunObjectIsReplacedAndGoneAfterAFailedCreation) {
-  double x, y, longitude, latitude;
-  ASSERT_EQ(cartographyCreate(0, 0, 0, "UTM-32"), 0);
-  ASSERT_EQ(cartographyCreate(9.0, 55.0, 5.0, "UTM-33"), 0);
-  cartographyGeoToProj(15.0, 0.0, &x, &y);
-  EXPECT_NEAR(x, 500000.0, 1e-6);
-  cartographyProjToGeo(x, y, &longitude, &latitude);
-  EXPECT_NEAR(longitude, 15.0, 1e-9);
-  EXPECT_NEAR(cartographyConvergence(18.0, 55.0), 2.458, 0.001);
-
-  // A failed creation leaves no object: results are NaN, not stale values.
-  ASSERT_EQ(cartographyCreate(0, 0, 0, "UTM-99"), -1);
-  cartographyGeoToProj(15.0, 0.0, &x, &y);
-  cartographyProjToGeo(500000.0, 0.0, &longitude, &latitude);
-  EXPECT_TRUE(std::isnan(x) && std::isnan(y) && std::isnan(longitude) && std::isnan(latitude));
-  EXPECT_TRUE(std::isnan(cartographyConvergence(15.0, 0.0)));
 }
 
 }  // namespace

@@ -84,7 +84,7 @@ TEST(InterpClosedForm, FewerThanFourHitsGiveTheInverseDistanceMean) {
   const double a = 2.0, b = 11.0, c = -4.0;
   LogCapture log;
   interp(run.observe({{0, 0, 0, a}, {4, 0, 0, b}, {2, 5, 0, c}}), 0, 0, 0, run.state,
-         run.settings);
+         run.context());
   const double at33 = (c / std::sqrt(5.0) + a / std::sqrt(18.0) + b / std::sqrt(10.0)) /
                       (1 / std::sqrt(5.0) + 1 / std::sqrt(18.0) + 1 / std::sqrt(10.0));
   const double at52 =

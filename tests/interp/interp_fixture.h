@@ -10,6 +10,7 @@
 
 #include "control/log.h"
 #include "params/run_settings.h"
+#include "state/run_context.h"
 #include "state/run_state.h"
 #include "support/file_description.h"
 #include "support/float_grid.h"
@@ -32,10 +33,6 @@ class TestRun {
     for (FloatGrid3D* g : {&state.basicValues, &state.basicBathymetry}) {
       *g = FloatGrid3D{0, 0, 0, nj, nk, nl, 1, 1, 1, std::int64_t{nj} * nk * nl, nullptr};
       grid3DAlloc(*g);
-    }
-    for (FloatGrid2D* g : {&state.layerValues, &state.layerBathymetry}) {
-      *g = FloatGrid2D{0, 0, nj, nk, nullptr};
-      grid2DAlloc(*g);
     }
     grid3DFill(state.basicBathymetry, bed);
     state.landValue = kLand;
@@ -71,6 +68,9 @@ class TestRun {
   float value(std::int32_t j, std::int32_t k, std::int32_t l) const {
     return state.basicValues.at(j, k, l);
   }
+  // The context of a run of these settings, its report going to the log.
+  RunContext context(int threads = 1) const { return RunContext{settings, runLog(), nullptr, threads}; }
+
   std::vector<float> values() const {
     return {state.basicValues.data, state.basicValues.data + state.basicValues.total};
   }

@@ -67,7 +67,7 @@ TEST(Interp, FillsTheFootprintOfTheLocalLevelsAndCountsIt) {
     run.settings.SearchRadius = c.searchRadius;
     run.settings.dx = 100.0f;
     LogCapture log;
-    interp(run.observe(c.observations), c.jOff, 0, c.lOff, run.state, run.settings);
+    interp(run.observe(c.observations), c.jOff, 0, c.lOff, run.state, run.context());
     std::vector<float> expected = c.expected;
     for (int i = 0; i < c.filterOperations; ++i) smoothLayer(expected.data(), c.nj, 1);
     EXPECT_EQ(run.values(), expected);
@@ -79,7 +79,7 @@ TEST(Interp, EstimatesReadTheLayerAsItWasBeforeItsPass) {
   // 3 x 2 layer with data at (0, 0) = 0 and (2, 1) = 12.
   TestRun run(3, 2, 1);
   LogCapture log;
-  interp(run.observe({{0, 0, 0, 0.0}, {2, 1, 0, 12.0}}), 0, 0, 0, run.state, run.settings);
+  interp(run.observe({{0, 0, 0, 0.0}, {2, 1, 0, 12.0}}), 0, 0, 0, run.state, run.context());
   const float diagonal = static_cast<float>(1.0 / std::sqrt(2.0));
   // (1, 0): Q1 (2, 1) diagonal, Q3 (0, 0) one away.
   const float n10 = (diagonal * 12.0f + 1.0f * 0.0f) / (diagonal + 1.0f);

@@ -13,6 +13,9 @@
 namespace karnet {
 namespace {
 
+// What the reader read last.
+RunParameters runParameters;
+
 // A parameter file with every section and keyword.
 const std::string kComplete =
     "// Temperature of the western Baltic on a 3-D grid\n"
@@ -107,7 +110,7 @@ class ParameterReaderTest : public ::testing::Test {
     std::size_t size = 0;
     std::FILE* stream = open_memstream(&buffer, &size);
     logSetStream(stream);
-    const int result = readParameterFile(path.c_str());
+    const int result = readParameterFile(path.c_str(), runParameters);
     logSetStream(nullptr);
     std::fclose(stream);
     log_.assign(buffer, size);
@@ -230,7 +233,7 @@ TEST_F(ParameterReaderTest, OnlyTheFirstOccurrenceCountsExtrasAreIgnoredNoLogIsN
                 "      Spacing = 3.5, 99\n      Spacing = 7\n      Unknown = 'x'\n"),
            "   [OUTPUT_DATA]\n", "   [EXTRA]\n      A = 1\n   EndSect\n   [OUTPUT_DATA]\n");
   logSetStream(nullptr);
-  ASSERT_EQ(readParameterFile(dir_.write("quiet.pfs", text).c_str()), 1);
+  ASSERT_EQ(readParameterFile(dir_.write("quiet.pfs", text).c_str(), runParameters), 1);
   EXPECT_EQ(runParameters.gridDescription.Spacing, 3.5f);
 }
 

@@ -14,9 +14,21 @@
 #include <vector>
 
 #include "control/log.h"
+#include "control/termination.h"
+#include "support/run_error.h"
 
 namespace karnet {
 namespace {
+
+// Runs fn and ends the run for the error it throws, as the run driver does.
+template <typename Fn>
+void asTheDriver(Fn fn) {
+  try {
+    fn();
+  } catch (const RunError& error) {
+    endRun(error);
+  }
+}
 
 using Bytes = unsigned char*;
 
@@ -60,7 +72,7 @@ TEST(CheckedAllocDeathTest, DamageAndBadPointersEndTheRunThroughTheReport) {
     std::snprintf(pointer, sizeof pointer, "; ptr = %p", static_cast<void*>(p));
     const std::string expected =
         std::string("^") + c.message + (c.namesPointer ? pointer : "") + "\n$";
-    EXPECT_EXIT({ logSetStream(std::fopen(path.c_str(), "w")); c.act(p); },
+    EXPECT_EXIT({ logSetStream(std::fopen(path.c_str(), "w")); asTheDriver([&] { c.act(p); }); },
                 ::testing::ExitedWithCode(1), expected);
     checkedFree(p);
     // The message goes to standard error only; the log gets the report alone.
@@ -77,9 +89,11 @@ TEST(CheckedAllocDeathTest, RequestsThePlatformCannotServeEndTheRun) {
   GTEST_SKIP() << "the address sanitizer reports failed allocations on its own";
 #endif
   GTEST_FLAG_SET(death_test_style, "fast");
-  EXPECT_EXIT(checkedAlloc(UINT64_MAX), ::testing::ExitedWithCode(1), "^Memory exhausted\n$");
+  EXPECT_EXIT(asTheDriver([] { checkedAlloc(UINT64_MAX); }), ::testing::ExitedWithCode(1),
+              "^Memory exhausted\n$");
   // An element count whose byte size does not fit 64 bits does not wrap around.
-  EXPECT_EXIT(checkedAllocArray<double>(UINT64_MAX / 4), ::testing::ExitedWithCode(1),
+  EXPECT_EXIT(asTheDriver([] { checkedAllocArray<double>(UINT64_MAX / 4); }),
+              ::testing::ExitedWithCode(1),
               "^Memory exhausted\n$");
 }
 
@@ -87,14 +101,14 @@ TEST(CheckedAllocDeathTest, RequestsThePlatformCannotServeEndTheRun) {
 TEST(CheckedAllocDeathTest, TableLimitAndQ84DebugInAFreshProcess) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   EXPECT_EXIT(
-      {
+      asTheDriver([] {
         std::vector<void*> blocks;
         for (int i = 0; i < 512; ++i) blocks.push_back(checkedAlloc(8));
         checkedFree(blocks[100]);
         blocks[100] = checkedAlloc(8);  // the freed slot serves again
         std::fputs("512 live\n", stderr);
         checkedAlloc(8);
-      },
+      }),
       ::testing::ExitedWithCode(1), "^512 live\nNo free slots for memeory allocation\n$");
   // Q84DEBUG, even when empty, fills every new block.
   EXPECT_EXIT(
