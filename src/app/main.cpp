@@ -124,12 +124,7 @@ int main(int argc, char** argv) {
   if (argc > 0 && argv[0] != nullptr) programPath = argv[0];
   argumentVector = argc > 0 ? argv + 1 : argv;
 
-  if (!karnet::rankLeads()) {
-    if (std::freopen("/dev/null", "w", stdout) == nullptr ||
-        std::freopen("/dev/null", "w", stderr) == nullptr) {
-      karnet::ranksAbort(1);
-    }
-  }
+  if (!karnet::ranksQuietFollower()) karnet::ranksAbort(1);
   // Every rank runs in the mode asked for, so that a cancel (SIGUSR1, which
   // mpirun passes on to all of them) reaches each.
   const bool hostMode = karnet::hasHostModeArgument(argumentCount, argumentVector);

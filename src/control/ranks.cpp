@@ -6,6 +6,10 @@
 #include <limits>
 
 #include <time.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <string>
 
 #ifdef KARNET_WITH_MPI
 // The C interface only, also when compiled as C++.
@@ -28,6 +32,9 @@ bool endAgreed = false;
 MPI_Comm endComm = MPI_COMM_NULL;
 constexpr int kCancelTag = 1;
 bool cancelAnnounced = false;
+// A follower's own standard error stream, and the file its messages go to.
+int followerStderr = -1;
+std::FILE* keptMessages = nullptr;
 // How long an ending rank waits for the others to end as well.
 constexpr double kEndWaitSeconds = 5.0;
 #endif
@@ -153,6 +160,49 @@ std::int32_t ranksAgreeOnEnd(std::int32_t ownCode) {
   return ownCode;
 }
 
+bool ranksQuietFollower() {
+#ifdef KARNET_WITH_MPI
+  if (ownRank == 0) return true;
+  if (std::freopen("/dev/null", "w", stdout) == nullptr) return false;
+  std::fflush(stderr);
+  followerStderr = dup(STDERR_FILENO);
+  keptMessages = std::tmpfile();
+  if (followerStderr < 0 || keptMessages == nullptr) return false;
+  return dup2(fileno(keptMessages), STDERR_FILENO) >= 0;
+#else
+  return true;
+#endif
+}
+
+#ifdef KARNET_WITH_MPI
+namespace {
+
+// What a follower that ends alone wrote to its standard error stream, shown
+// on its own stream with its rank.
+void showKeptMessages(std::int32_t exitCode) {
+  if (followerStderr < 0 || keptMessages == nullptr) return;
+  std::fflush(stderr);
+  std::string text = "karnet: rank " + std::to_string(ownRank) + " of " +
+                     std::to_string(rankTotal) + " stopped alone with exit code " +
+                     std::to_string(exitCode) + "\n";
+  char buffer[4096];
+  off_t at = 0;
+  ssize_t n = 0;
+  while (text.size() < 65536 && (n = pread(fileno(keptMessages), buffer, sizeof buffer, at)) > 0) {
+    text.append(buffer, static_cast<std::size_t>(n));
+    at += n;
+  }
+  if (!text.empty() && text.back() != '\n') text += '\n';
+  for (std::size_t done = 0; done < text.size();) {
+    const ssize_t w = write(followerStderr, text.data() + done, text.size() - done);
+    if (w <= 0) break;
+    done += static_cast<std::size_t>(w);
+  }
+}
+
+}  // namespace
+#endif
+
 void ranksAnnounceCancel() {
 #ifdef KARNET_WITH_MPI
   if (!joined || finished || ownRank != 0 || cancelAnnounced) return;
@@ -202,7 +252,10 @@ void ranksEnd(std::int32_t exitCode) {
       struct timespec pause = {0, 1000000};
       nanosleep(&pause, nullptr);
     }
-    if (done == 0) return;
+    if (done == 0) {
+      showKeptMessages(exitCode);
+      return;
+    }
   } else if (rankTotal > 1) {
     // No rank leaves before all have closed their log: the launcher ends the
     // job as soon as one rank exits with an error.

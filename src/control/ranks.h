@@ -32,6 +32,12 @@ inline bool rankLeads() { return rankIndex() == 0; }
 // gets the sums. Without a job the values stay as they are.
 void ranksSum(std::int64_t* values, int count);
 
+// For every rank but 0: its standard output goes nowhere and its standard
+// error stream is kept aside, to be shown only when the rank ends alone (see
+// ranksEnd); rank 0 speaks for the run. False when the streams could not be
+// set up.
+bool ranksQuietFollower();
+
 // Sends count floats to rank `to` / receives them from rank `from`; tag
 // tells the messages of one pair apart. Blocking, in the order called.
 void ranksSendFloats(const float* data, std::size_t count, int to, int tag);
@@ -48,7 +54,8 @@ std::int32_t ranksAgreeOnEnd(std::int32_t ownCode);
 // or when all ranks end by themselves within a short wait (an error in the
 // inputs, which every rank meets). Otherwise it leaves the job as it is, so
 // that the process's exit makes the launcher end the others (a rank alone in
-// MPI_Finalize would wait for them forever).
+// MPI_Finalize would wait for them forever); a rank other than 0 that ends
+// alone then shows what it kept of its standard error stream.
 void ranksEnd(std::int32_t exitCode);
 
 // A cancel of the run: rank 0 tells every other rank (once, without
