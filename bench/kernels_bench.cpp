@@ -185,7 +185,7 @@ BENCHMARK(BM_BilinearLayer)->Unit(benchmark::kMillisecond);
 
 // One layer of the objective analysis (analyseLayer). Arguments: layer size,
 // data density in per mille, search radius in nodes, CorrelationSampleSize,
-// FilterOperations (Shapiro).
+// FilterOperations (Shapiro), and 1 to write the error field as well.
 void BM_ObjectiveAnalysisLayer(benchmark::State& state) {
   const auto size = static_cast<std::int32_t>(state.range(0));
   RunSettings settings = analysisSettings(size, size, static_cast<float>(state.range(2)),
@@ -195,7 +195,14 @@ void BM_ObjectiveAnalysisLayer(benchmark::State& state) {
       randomLayer(size, size, static_cast<double>(state.range(1)) / 1000.0, 2024);
   std::vector<float> bed(layer.size(), -20.0f);
   const FloatGrid2D bedGrid{0, 0, size, size, bed.data()};
-  const LayerAnalysisInput input{&bedGrid, 999.0, static_cast<double>(kHole), 0, 0, 0};
+  LayerAnalysisInput input{&bedGrid, 999.0, static_cast<double>(kHole), 0, 0, 0};
+  std::vector<float> errors(layer.size(), kHole);
+  FloatGrid3D errorField;
+  errorField.nj = errorField.nk = size;
+  errorField.nl = 1;
+  errorField.total = std::int64_t{size} * size;
+  errorField.data = errors.data();
+  if (state.range(5) != 0) input.errorField = &errorField;
   std::vector<float> work;
   for (auto _ : state) {
     state.PauseTiming();
@@ -210,9 +217,11 @@ void BM_ObjectiveAnalysisLayer(benchmark::State& state) {
   state.SetItemsProcessed(state.iterations() * size * size);
 }
 BENCHMARK(BM_ObjectiveAnalysisLayer)
-    ->Args({300, 20, 10, 20, 0})   // workload L's density and settings
-    ->Args({200, 50, 20, 20, 1})   // 2000 cells in 200 x 200, smoothed
-    ->Args({120, 250, 20, 50, 0})  // dense: hundreds of candidates, 50 chosen
+    ->Args({300, 20, 10, 20, 0, 0})   // workload L's density and settings
+    ->Args({200, 50, 20, 20, 1, 0})   // 2000 cells in 200 x 200, smoothed
+    ->Args({200, 50, 20, 20, 1, 1})   // the same with the error field
+    ->Args({120, 250, 20, 50, 0, 0})  // dense: hundreds of candidates, 50 chosen
+    ->Args({120, 250, 20, 50, 0, 1})  // the same with the error field
     ->Unit(benchmark::kMillisecond);
 
 }  // namespace

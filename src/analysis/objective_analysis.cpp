@@ -15,6 +15,7 @@
 #include <string>
 #include <vector>
 
+#include "analysis/error_variance.h"
 #include "analysis/filters.h"
 #include "analysis/objan.h"
 #include "analysis/select_data.h"
@@ -53,6 +54,13 @@ void collectDataCells(OaWorkspace& ws, const FloatGrid2D& grid, std::int32_t nDa
     }
   }
   ws.dataCount = collected;
+}
+
+// Stores e at local node (p, q, s) of the error field, when the node lies in it.
+void recordErrorVariance(FloatGrid3D& field, float e, std::int64_t p, std::int64_t q,
+                         std::int64_t s) {
+  if (p < 0 || p >= field.nj || q < 0 || q >= field.nk || s < 0 || s >= field.nl) return;
+  field.data[(s * field.nk + q) * field.nj + p] = e;
 }
 
 // The storage of one thread's estimates: the candidate and chosen-cell arrays
@@ -142,7 +150,7 @@ std::int32_t analyseLayer(OaWorkspace& ws, FloatGrid2D& grid, std::int32_t nData
 }
 
 std::int32_t analyseLayer(OaWorkspace& ws, FloatGrid2D& grid, std::int32_t nData,
-                          const LayerAnalysisInput& input, std::int32_t /*l*/,
+                          const LayerAnalysisInput& input, std::int32_t l,
                           std::int32_t& failures, const RunSettings& settings,
                           LayerTeam& team) {
   const std::int32_t nj = grid.nj;
@@ -188,6 +196,11 @@ std::int32_t analyseLayer(OaWorkspace& ws, FloatGrid2D& grid, std::int32_t nData
         // arrays, not the grid, feed later estimates.
         if (OBJAN(scratch->ws, m, &grid.data[at], settings, &scratch->inverse) == 0) {
           ++successes;
+          // The inverse the estimate used is still in the matrix, cached or not.
+          if (input.errorField != nullptr) {
+            recordErrorVariance(*input.errorField, estimateErrorVariance(scratch->ws, m),
+                                j - input.jOff, k - input.kOff, l - input.lOff);
+          }
         } else {
           ++failed;
         }
@@ -264,7 +277,8 @@ class LayerWorkspace {
 }  // namespace
 
 void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff,
-                       std::int32_t lOff, RunState& state, const RunContext& context) {
+                       std::int32_t lOff, RunState& state, const RunContext& context,
+                       FloatGrid3D* errorField) {
   const RunSettings& settings = context.settings;
   setadj(lastObs, state, settings);
 
@@ -315,7 +329,9 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
         input.deleteValue = deleteValue;
         input.jOff = jOff;
         input.kOff = kOff;
-        input.lOff = lOff;
+        // The error field holds the levels this process holds, from its first.
+        input.lOff = lOff + held.first;
+        input.errorField = errorField;
         LayerTeam team;
         team.threads = share.rows;
         team.progress = &progress;

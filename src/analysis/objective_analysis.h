@@ -20,10 +20,14 @@ class WorkProgress;
 // [MinData, MaxData], blanks dry nodes and writes each layer back into
 // state.basicValues. Ends with the statistics block in the context's report.
 // (jOff, kOff, lOff) is the basic node of the local grid's first node. Uses
-// context.threads threads; the result does not depend on them. Throws the
+// context.threads threads; the result does not depend on them. errorField,
+// when given, is a grid of the local grid's shape (filled with the delete value
+// beforehand) that receives the relative error variance of every successful
+// estimate at its node. Throws the
 // RunError of a cancel, an interrupt or a failed allocation.
 void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff,
-                       std::int32_t lOff, RunState& state, const RunContext& context);
+                       std::int32_t lOff, RunState& state, const RunContext& context,
+                       FloatGrid3D* errorField = nullptr);
 
 // Number of cells of the grid that hold a value (differ from deleteValue).
 std::int32_t countDataCells(const FloatGrid2D& grid, double deleteValue);
@@ -36,6 +40,10 @@ struct LayerAnalysisInput {
   std::int32_t jOff = 0;                    // basic node of the local grid's first node
   std::int32_t kOff = 0;
   std::int32_t lOff = 0;
+  // When set: the local grid's error field; every successful estimate at
+  // footprint node (j, k) of layer l writes its relative error variance to
+  // local node (j - jOff, k - kOff, l - lOff).
+  FloatGrid3D* errorField = nullptr;
 };
 
 // How one layer's analysis runs: the threads that share its nodes, the

@@ -9,6 +9,7 @@
 #include <cstdlib>
 
 #include "control/command_line.h"
+#include "control/cross_validate_run.h"
 #include "control/host.h"
 #include "control/log.h"
 #include "control/ranks.h"
@@ -32,6 +33,15 @@ constexpr char kHelp[] =
     "  //apv      run under the progress display; q or SIGUSR1 cancels the run\n"
     "  --quiet    no summary (result, grid, observations) on stderr at the end\n"
     "  -debug     accepted, without effect\n"
+    "  --cross-validate\n"
+    "             leave one cast out at a time and compare the objective analysis\n"
+    "             with it: RMS and bias per level on stdout and in CASE_cv.csv;\n"
+    "             no result file is written\n"
+    "  --sweep KEYWORD=V1,V2,... [KEYWORD=...]\n"
+    "             cross-validate every combination of these objective-analysis\n"
+    "             values (DecayDistance, ZeroCrossingDistance, ErrorVariance,\n"
+    "             CorrelationSampleSize, SearchRadius, MinData, MaxData); the table,\n"
+    "             best combination marked, goes to stdout and CASE_sweep.csv\n"
     "  --threads N\n"
     "             threads of the computation (default: KARNET_THREADS, else all\n"
     "             cores); the result is the same for any number\n"
@@ -56,6 +66,7 @@ constexpr char kHelp[] =
 int argumentCount = 0;
 char** argumentVector = nullptr;
 const char* programPath = "karnet";
+karnet::CrossValidationRequest crossValidation;
 
 // Picks the parameter file, opens the log beside it, sets the run up and runs it.
 [[noreturn]] void runMain(int count, char** arguments) {
@@ -86,6 +97,7 @@ const char* programPath = "karnet";
   invocation.commandLine = karnet::commandLineText(programPath, count, arguments);
   invocation.quiet = karnet::hasQuietArgument(count, arguments);
   invocation.threads = threads;
+  invocation.crossValidation = crossValidation;
   karnet::runProgram(parameterFile, invocation);
 }
 
@@ -133,6 +145,13 @@ int main(int argc, char** argv) {
   if (answerInformationRequest(argumentCount, argumentVector)) {
     karnet::ranksFinish();
     return 0;
+  }
+
+  std::string problem;
+  if (!karnet::takeCrossValidationArguments(argumentCount, argumentVector, crossValidation,
+                                            problem)) {
+    std::fprintf(stderr, "karnet: %s\n%s\n", problem.c_str(), kUsage);
+    return 1;
   }
 
   if (hostMode) {

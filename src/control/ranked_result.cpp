@@ -14,7 +14,8 @@ namespace karnet {
 
 int writeRankedResult(const RunInvocation& invocation, RunState& state,
                       const RunParameters& parameters, const RunSettings& settings,
-                      const ObservationTally& tally, RunSummary* summary) {
+                      const ObservationTally& tally, const FloatGrid3D* errorField,
+                      RunSummary* summary) {
   const FileDescription& description = *state.resultDescription;
   const std::int32_t nx = description.axes[1].lastIndex + 1;
   const std::int32_t ny = description.axes[2].lastIndex + 1;
@@ -22,7 +23,7 @@ int writeRankedResult(const RunInvocation& invocation, RunState& state,
   // The analysis is done: the wet/dry field is not needed any more, and its
   // room serves the result file that rank 0 builds.
   grid3DFree(state.basicBathymetry);
-  LevelGather gather(state, nx, ny, nz);
+  LevelGather gather(state, nx, ny, nz, errorField);
   if (!rankLeads()) {
     gather.sendHeld();
     return 1;
@@ -46,9 +47,11 @@ int writeRankedResult(const RunInvocation& invocation, RunState& state,
   progressStatus("Saving data ...");
   const TextAttributes attributes = resultGlobalAttributes(
       parameters, invocation.commandLine, KARNET_VERSION, resultTimestamp());
+  const ResultLevelSource errors = gather.errorSource();
   const int written =
       resultWriteLevels(parameters.outputData.FileName, description,
-                        parameters.outputData.ItemType, levels, settings.projection, &attributes);
+                        parameters.outputData.ItemType, levels, settings.projection, &attributes,
+                        errorField != nullptr ? &errors : nullptr);
   // A writer that stopped early leaves levels on their way.
   gather.drain();
   if (summary != nullptr) *summary = counted;

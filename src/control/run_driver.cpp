@@ -9,6 +9,7 @@
 #include "analysis/objective_analysis.h"
 #include "control/log.h"
 #include "control/progress.h"
+#include "control/cross_validate_run.h"
 #include "control/ranked_result.h"
 #include "control/ranks.h"
 #include "control/run_summary.h"
@@ -90,14 +91,31 @@ int runPhases(Run& run, RunSummary* summary) {
   progressStatus("Scanning bathymetry ...");
   bathymetryScan(jOff, kOff, lOff, state, settings);
   progressStatus("Initialising ...");
+  // The objective analysis also gives the error variance of its estimates,
+  // written beside the result's item; nodes without an estimate keep the fill.
+  FloatGrid3D errorField;
   if (settings.Analysis == 0) {
-    objectiveAnalysis(lastObs, jOff, kOff, lOff, state, context);
+    errorField = state.localValues;
+    errorField.data = nullptr;
+    // Each process holds the error field of its own levels.
+    const LevelRange held =
+        state.heldSteps(lOff, std::int64_t{settings.lx} - settings.l0 + 1);
+    errorField.l0 = settings.l0 + held.first;
+    errorField.nl = held.count;
+    errorField.total = state.localValues.layerSize() * held.count;
+    grid3DAlloc(errorField);
+    grid3DFill(errorField, static_cast<float>(state.deleteValue()));
+    objectiveAnalysis(lastObs, jOff, kOff, lOff, state, context, &errorField);
   } else {
     interp(lastObs, jOff, kOff, lOff, state, context);
   }
   // Over several processes the levels meet only in the result file.
   if (rankCount() > 1) {
-    return writeRankedResult(run.invocation, state, parameters, settings, tally, summary);
+    const int written = writeRankedResult(run.invocation, state, parameters, settings, tally,
+                                          errorField.data != nullptr ? &errorField : nullptr,
+                                          summary);
+    if (errorField.data != nullptr) grid3DFree(errorField);
+    return written;
   }
   glo2loc(jOff, kOff, lOff, state, settings);
   if (summary != nullptr) {
@@ -108,9 +126,12 @@ int runPhases(Run& run, RunSummary* summary) {
   progressStatus("Saving data ...");
   const TextAttributes attributes = resultGlobalAttributes(
       parameters, run.invocation.commandLine, KARNET_VERSION, resultTimestamp());
-  return resultWrite(parameters.outputData.FileName, *state.resultDescription, 1,
-                     parameters.outputData.ItemType, state.localValues, settings.projection,
-                     &attributes);
+  const int written =
+      resultWrite(parameters.outputData.FileName, *state.resultDescription, 1,
+                  parameters.outputData.ItemType, state.localValues, settings.projection,
+                  &attributes, errorField.data != nullptr ? &errorField : nullptr);
+  if (errorField.data != nullptr) grid3DFree(errorField);
+  return written;
 }
 
 void freeRunArrays(RunState& state) {
@@ -141,7 +162,11 @@ void runProgram(const char* parameterFile, const RunInvocation& invocation) {
     run.invocation = invocation;
     if (run.invocation.threads < 1) run.invocation.threads = 1;
     setupRun(parameterFile, run);
-    runDriver(run);
+    if (run.invocation.crossValidation.active) {
+      crossValidateRun(run, parameterFile);
+    } else {
+      runDriver(run);
+    }
   } catch (const RunError& error) {
     endRun(error);
   } catch (const std::bad_alloc&) {

@@ -4,6 +4,7 @@
 #include <memory>
 #include <string>
 
+#include "control/cross_validate_request.h"
 #include "input/cartography.h"
 #include "params/run_parameters.h"
 #include "params/run_settings.h"
@@ -18,6 +19,7 @@ struct RunInvocation {
   std::string commandLine;  // program and arguments, recorded in the result's history
   bool quiet = false;       // no summary on stderr at the end of the run
   int threads = 1;          // threads of the layer loops
+  CrossValidationRequest crossValidation;  // --cross-validate, --sweep: no result, a table
 };
 
 // Everything one run holds from its setup to its end. The driver owns it; the

@@ -54,6 +54,12 @@ int grdSetDataType(GrdHeader* header, int dataType);
 int grdSetEqTimeAxis(GrdHeader* header, int unit, double start, double step, int firstStep);
 int grdSetItemInfo(GrdHeader* header, GrdItem* item, std::int32_t itemType, const char* key,
                    std::int32_t unit, int flag);
+// Extra text attributes of an item, written after those grdSetItemInfo gives
+// it; a name it already has (long_name, units) is replaced.
+int grdSetItemAttribute(GrdItem* item, const char* name, const char* text);
+// Names item `ancillary` (of the same header) in the item's CF
+// ancillary_variables attribute.
+int grdSetItemAncillary(GrdItem* item, GrdItem* ancillary);
 int grdSetItemAxisEqD3(GrdItem* item, int axisUnit, std::int32_t nx, std::int32_t ny,
                        std::int32_t nz, float x0, float y0, float z0, float dx, float dy,
                        float dz);
@@ -94,12 +100,15 @@ int grdSetGeoreference(GrdHeader* header, const GrdGeoreference& georeference);
 // grdSetEqTimeAxis the file has no time dimension and takes one step.
 int grdFileCreate(const char* fileName, GrdHeader* header, GrdFile** file);
 int grdWriteItemTimeStep(GrdHeader* header, GrdFile* file, double time, const float* data);
+// Writes the next time step of item itemNumber (from 1; item 1 as above).
+int grdWriteItemNTimeStep(GrdHeader* header, GrdFile* file, int itemNumber, double time,
+                          const float* data);
 // The same time step level by level: grdWriteItemLevel stores z level `level`
-// (x fastest, then y) of the step being written, in any order, and
-// grdFinishItemTimeStep then sets the step's time and closes it. Writing the
-// levels in increasing order gives the same file as one grdWriteItemTimeStep.
-int grdWriteItemLevel(GrdHeader* header, GrdFile* file, std::int32_t level, const float* data);
-int grdFinishItemTimeStep(GrdHeader* header, GrdFile* file, double time);
+// (x fastest, then y) of the step of item itemNumber being written, in any
+// order, and grdFinishItemTimeStep then sets the step's time and closes it.
+int grdWriteItemLevel(GrdHeader* header, GrdFile* file, std::int32_t level, const float* data,
+                      int itemNumber = 1);
+int grdFinishItemTimeStep(GrdHeader* header, GrdFile* file, double time, int itemNumber = 1);
 // Closes the file; a complete file is renamed to its final name. Sets *file to null.
 int grdFileClose(GrdHeader* header, GrdFile** file);
 // Drops a file that was created but must not appear; nothing of it reaches the disk.

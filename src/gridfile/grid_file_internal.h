@@ -12,6 +12,7 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "gridfile/grid_file.h"
@@ -62,6 +63,8 @@ struct GrdItem {
   std::int32_t counts[3] = {0, 0, 0};  // x, y, z
   float origins[3] = {0, 0, 0};
   float spacings[3] = {0, 0, 0};
+  std::vector<std::pair<std::string, std::string>> attributes;  // extra text attributes
+  const GrdItem* ancillary = nullptr;  // named in ancillary_variables
 };
 
 struct GrdCustomBlock {
@@ -79,6 +82,8 @@ struct GrdFile {
   // writing
   std::string finalName;
   int itemVar = -1;
+  std::vector<int> itemVars;          // every item's variable, item 1 first
+  std::vector<std::size_t> itemSteps;  // time steps written of each item
   int timeVar = -1;
   bool hasTime = false;
   std::size_t stepsWritten = 0;

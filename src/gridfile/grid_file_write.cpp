@@ -311,6 +311,18 @@ std::vector<std::string> itemNames(const GrdHeader& header) {
   return names;
 }
 
+// An item's extra attributes and its link to an ancillary item, once every
+// item variable has its name.
+void describeItemFurther(NcStatus& status, int ncid, const GrdHeader& header, int varid,
+                         const GrdItem& item, const std::vector<std::string>& names) {
+  for (const auto& [name, text] : item.attributes) putText(status, ncid, varid, name.c_str(), text);
+  for (std::size_t i = 0; i < header.items.size(); ++i) {
+    if (header.items[i].get() == item.ancillary) {
+      putText(status, ncid, varid, "ancillary_variables", names[i]);
+    }
+  }
+}
+
 bool defineFile(int ncid, const GrdHeader& header, Layout& layout) {
   NcStatus status;
   const GrdItem& first = *header.items[0];
@@ -329,6 +341,9 @@ bool defineFile(int ncid, const GrdHeader& header, Layout& layout) {
   const std::vector<std::string> names = itemNames(header);
   for (std::size_t i = 0; i < header.items.size() && status.ok(); ++i) {
     defineItem(status, ncid, header, layout, *header.items[i], names[i]);
+  }
+  for (std::size_t i = 0; i < header.items.size() && status.ok(); ++i) {
+    describeItemFurther(status, ncid, header, layout.itemVars[i], *header.items[i], names);
   }
   if (g != nullptr && g->rowGeolocation && status.ok()) {
     defineGeolocation(status, ncid, layout, first);
@@ -437,6 +452,28 @@ int grdSetItemInfo(GrdHeader* header, GrdItem* item, std::int32_t itemType, cons
   return 0;
 }
 
+int grdSetItemAttribute(GrdItem* item, const char* name, const char* text) {
+  if (item == nullptr || !writable(item->header) || name == nullptr || text == nullptr) return 1;
+  if (name[0] == '\0' || std::strlen(name) > NC_MAX_NAME || std::strcmp(name, "_FillValue") == 0) {
+    return 1;
+  }
+  for (auto& attribute : item->attributes) {
+    if (attribute.first == name) {
+      attribute.second = text;
+      return 0;
+    }
+  }
+  item->attributes.emplace_back(name, text);
+  return 0;
+}
+
+int grdSetItemAncillary(GrdItem* item, GrdItem* ancillary) {
+  if (item == nullptr || !writable(item->header) || item == ancillary) return 1;
+  if (!ownedBy(ancillary, item->header)) return 1;
+  item->ancillary = ancillary;
+  return 0;
+}
+
 int grdSetItemAxisEqD3(GrdItem* item, int axisUnit, std::int32_t nx, std::int32_t ny,
                        std::int32_t nz, float x0, float y0, float z0, float dx, float dy,
                        float dz) {
@@ -528,6 +565,8 @@ int grdFileCreate(const char* fileName, GrdHeader* header, GrdFile** file) {
   f->forWriting = true;
   f->finalName = fileName;
   f->itemVar = layout.itemVars[0];
+  f->itemVars = layout.itemVars;
+  f->itemSteps.assign(layout.itemVars.size(), 0);
   f->timeVar = layout.timeVar;
   f->hasTime = header->timeAxis;
   header->writeFile = f.get();
@@ -536,13 +575,21 @@ int grdFileCreate(const char* fileName, GrdHeader* header, GrdFile** file) {
 }
 
 int grdWriteItemTimeStep(GrdHeader* header, GrdFile* file, double time, const float* data) {
+  return grdWriteItemNTimeStep(header, file, 1, time, data);
+}
+
+int grdWriteItemNTimeStep(GrdHeader* header, GrdFile* file, int itemNumber, double time,
+                          const float* data) {
   if (!validOpenFile(header, file) || data == nullptr) return 1;
-  if (file->failed || (!file->hasTime && file->stepsWritten > 0)) return 1;
-  const GrdItem& item = *header->items[0];
+  if (itemNumber < 1 || static_cast<std::size_t>(itemNumber) > file->itemVars.size()) return 1;
+  const auto n = static_cast<std::size_t>(itemNumber - 1);
+  const std::size_t step = file->itemSteps[n];
+  if (file->failed || (!file->hasTime && step > 0)) return 1;
+  const GrdItem& item = *header->items[n];
   std::vector<std::size_t> start;
   std::vector<std::size_t> count;
   if (file->hasTime) {
-    start.push_back(file->stepsWritten);
+    start.push_back(step);
     count.push_back(1);
   }
   for (int d = item.axisDims - 1; d >= 0; --d) {
@@ -550,28 +597,32 @@ int grdWriteItemTimeStep(GrdHeader* header, GrdFile* file, double time, const fl
     count.push_back(static_cast<std::size_t>(item.counts[d]));
   }
   NcStatus status;
-  status(nc_put_vara_float(file->ncid, file->itemVar, start.data(), count.data(), data));
+  status(nc_put_vara_float(file->ncid, file->itemVars[n], start.data(), count.data(), data));
   if (file->hasTime && status.ok()) {
-    const std::size_t index = file->stepsWritten;
-    status(nc_put_var1_double(file->ncid, file->timeVar, &index, &time));
+    status(nc_put_var1_double(file->ncid, file->timeVar, &step, &time));
   }
   if (!status.ok()) {
     file->failed = true;
     return 1;
   }
-  ++file->stepsWritten;
+  file->itemSteps[n] = step + 1;
+  file->stepsWritten = std::max(file->stepsWritten, step + 1);
   return 0;
 }
 
-int grdWriteItemLevel(GrdHeader* header, GrdFile* file, std::int32_t level, const float* data) {
+int grdWriteItemLevel(GrdHeader* header, GrdFile* file, std::int32_t level, const float* data,
+                      int itemNumber) {
   if (!validOpenFile(header, file) || data == nullptr) return 1;
-  if (file->failed || (!file->hasTime && file->stepsWritten > 0)) return 1;
-  const GrdItem& item = *header->items[0];
+  if (itemNumber < 1 || static_cast<std::size_t>(itemNumber) > file->itemVars.size()) return 1;
+  const auto n = static_cast<std::size_t>(itemNumber - 1);
+  const std::size_t step = file->itemSteps[n];
+  if (file->failed || (!file->hasTime && step > 0)) return 1;
+  const GrdItem& item = *header->items[n];
   if (item.axisDims != 3 || level < 0 || level >= item.counts[2]) return 1;
   std::vector<std::size_t> start;
   std::vector<std::size_t> count;
   if (file->hasTime) {
-    start.push_back(file->stepsWritten);
+    start.push_back(step);
     count.push_back(1);
   }
   start.push_back(static_cast<std::size_t>(level));
@@ -581,7 +632,7 @@ int grdWriteItemLevel(GrdHeader* header, GrdFile* file, std::int32_t level, cons
     count.push_back(static_cast<std::size_t>(item.counts[d]));
   }
   NcStatus status;
-  status(nc_put_vara_float(file->ncid, file->itemVar, start.data(), count.data(), data));
+  status(nc_put_vara_float(file->ncid, file->itemVars[n], start.data(), count.data(), data));
   if (!status.ok()) {
     file->failed = true;
     return 1;
@@ -589,19 +640,22 @@ int grdWriteItemLevel(GrdHeader* header, GrdFile* file, std::int32_t level, cons
   return 0;
 }
 
-int grdFinishItemTimeStep(GrdHeader* header, GrdFile* file, double time) {
+int grdFinishItemTimeStep(GrdHeader* header, GrdFile* file, double time, int itemNumber) {
   if (!validOpenFile(header, file)) return 1;
-  if (file->failed || (!file->hasTime && file->stepsWritten > 0)) return 1;
+  if (itemNumber < 1 || static_cast<std::size_t>(itemNumber) > file->itemVars.size()) return 1;
+  const auto n = static_cast<std::size_t>(itemNumber - 1);
+  const std::size_t step = file->itemSteps[n];
+  if (file->failed || (!file->hasTime && step > 0)) return 1;
   if (file->hasTime) {
     NcStatus status;
-    const std::size_t index = file->stepsWritten;
-    status(nc_put_var1_double(file->ncid, file->timeVar, &index, &time));
+    status(nc_put_var1_double(file->ncid, file->timeVar, &step, &time));
     if (!status.ok()) {
       file->failed = true;
       return 1;
     }
   }
-  ++file->stepsWritten;
+  file->itemSteps[n] = step + 1;
+  file->stepsWritten = std::max(file->stepsWritten, step + 1);
   return 0;
 }
 

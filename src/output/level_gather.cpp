@@ -33,39 +33,72 @@ void extractResultLevel(const RunState& state, std::int32_t s, std::int32_t nx, 
   }
 }
 
-LevelGather::LevelGather(const RunState& state, std::int32_t nx, std::int32_t ny, std::int32_t nz)
-    : state_(state), nx_(nx), ny_(ny), nz_(nz), taken_(static_cast<std::size_t>(nz), false) {}
+LevelGather::LevelGather(const RunState& state, std::int32_t nx, std::int32_t ny, std::int32_t nz,
+                         const FloatGrid3D* errors)
+    : state_(state),
+      nx_(nx),
+      ny_(ny),
+      nz_(nz),
+      errors_(errors),
+      taken_(static_cast<std::size_t>(nz) * 2, false) {}
+
+void LevelGather::copyError(std::int32_t s, float* out) const {
+  const std::int64_t layer = std::int64_t{nx_} * ny_;
+  // The error field's level s comes from local level l0 + s of the grid.
+  const std::int64_t at = std::int64_t{state_.window.l0} + s - errors_->l0;
+  if (errors_->data == nullptr || errors_->layerSize() != layer || at < 0 || at >= errors_->nl) {
+    std::fill(out, out + layer, static_cast<float>(state_.deleteValue()));
+    return;
+  }
+  std::copy(errors_->data + at * layer, errors_->data + (at + 1) * layer, out);
+}
 
 void LevelGather::sendHeld() const {
   std::vector<float> level(static_cast<std::size_t>(std::int64_t{nx_} * ny_));
   const std::int32_t lOff = state_.window.lOff;
-  for (std::int32_t s = 0; s < nz_; ++s) {
-    if (levelOwner(state_.levelOwners, lOff + s) != rankIndex()) continue;
-    extractResultLevel(state_, s, nx_, ny_, level.data());
-    ranksSendFloats(level.data(), level.size(), 0, s);
+  for (int item = 1; item <= (errors_ != nullptr ? 2 : 1); ++item) {
+    for (std::int32_t s = 0; s < nz_; ++s) {
+      if (levelOwner(state_.levelOwners, lOff + s) != rankIndex()) continue;
+      if (item == 1) {
+        extractResultLevel(state_, s, nx_, ny_, level.data());
+      } else {
+        copyError(s, level.data());
+      }
+      ranksSendFloats(level.data(), level.size(), 0, (item - 1) * nz_ + s);
+    }
   }
 }
 
-bool LevelGather::take(std::int32_t s, float* buffer) {
-  if (s < 0 || s >= nz_) return false;
+bool LevelGather::take(int item, std::int32_t s, float* buffer) {
+  if (s < 0 || s >= nz_ || (item == 2 && errors_ == nullptr)) return false;
+  const std::size_t slot = static_cast<std::size_t>((item - 1) * nz_ + s);
   const int owner = levelOwner(state_.levelOwners, state_.window.lOff + s);
-  if (owner > 0 && !taken_[static_cast<std::size_t>(s)]) {
-    ranksReceiveFloats(buffer, static_cast<std::size_t>(std::int64_t{nx_} * ny_), owner, s);
-  } else {
+  if (owner > 0 && !taken_[slot]) {
+    ranksReceiveFloats(buffer, static_cast<std::size_t>(std::int64_t{nx_} * ny_), owner,
+                       static_cast<int>(slot));
+  } else if (item == 1) {
     extractResultLevel(state_, s, nx_, ny_, buffer);
+  } else {
+    copyError(s, buffer);
   }
-  taken_[static_cast<std::size_t>(s)] = true;
+  taken_[slot] = true;
   return true;
 }
 
 ResultLevelSource LevelGather::source() {
-  return [this](std::int32_t s, float* buffer) { return take(s, buffer); };
+  return [this](std::int32_t s, float* buffer) { return take(1, s, buffer); };
+}
+
+ResultLevelSource LevelGather::errorSource() {
+  return [this](std::int32_t s, float* buffer) { return take(2, s, buffer); };
 }
 
 void LevelGather::drain() {
   std::vector<float> level(static_cast<std::size_t>(std::int64_t{nx_} * ny_));
-  for (std::int32_t s = 0; s < nz_; ++s) {
-    if (!taken_[static_cast<std::size_t>(s)]) take(s, level.data());
+  for (int item = 1; item <= (errors_ != nullptr ? 2 : 1); ++item) {
+    for (std::int32_t s = 0; s < nz_; ++s) {
+      if (!taken_[static_cast<std::size_t>((item - 1) * nz_ + s)]) take(item, s, level.data());
+    }
   }
 }
 

@@ -13,6 +13,16 @@
 namespace karnet {
 namespace {
 
+// Item type "Undefined": no standard name, dimensionless.
+constexpr std::int32_t kUnitlessItemType = 1;
+
+constexpr char kErrorComment[] =
+    "ordinary-kriging error variance of the objective-analysis estimate relative to the "
+    "signal variance, 1 - r'A^-1 r + (1 - 1'A^-1 r)^2 / (1'A^-1 1), clipped to [0, 1]; "
+    "r: correlations of the node with the data cells used, A: their correlation matrix with "
+    "the error variance on its diagonal; before smoothing and clipping of the estimate; "
+    "fill value where the node got no estimate";
+
 // Every header call up to the file's creation; the first failure stops them.
 int describeResult(GrdHeader* header, const FileDescription& d, std::int32_t itemType,
                    const char* projection, const TextAttributes* attributes) {
@@ -46,22 +56,52 @@ int describeResult(GrdHeader* header, const FileDescription& d, std::int32_t ite
   return grdSetGeoreference(header, georeference);
 }
 
+// The error field as item 2: named after item 1 with "_error", unitless,
+// linked from item 1 as its ancillary variable.
+int describeErrorItem(GrdHeader* header, const FileDescription& d, std::int32_t itemType) {
+  std::string key;
+  unitGetItemTypeKey(itemType, &key);
+  if (key.empty()) key = std::string("item_").append(std::to_string(itemType));
+  const std::string name = key + "_error";
+  const std::string longName = "relative error variance of the " + key + " estimate";
+  GrdItem* item = grdItemD(header, 1);
+  GrdItem* error = grdItemD(header, 2);
+  if (item == nullptr || error == nullptr) return 1;
+  if (grdSetItemInfo(header, error, kUnitlessItemType, name.c_str(), 0, 1) != 0) return 1;
+  if (grdSetItemUnitConversion(error, 3, 0) != 0) return 1;
+  if (grdSetItemAxisEqD3(error, 1000, d.axes[1].lastIndex + 1, d.axes[2].lastIndex + 1,
+                         d.axes[3].lastIndex + 1, 0.0f, 0.0f, 0.0f, d.axes[1].spacing,
+                         d.axes[2].spacing, d.axes[3].spacing) != 0) {
+    return 1;
+  }
+  if (grdSetItemAttribute(error, "long_name", longName.c_str()) != 0 ||
+      grdSetItemAttribute(error, "units", "1") != 0 ||
+      grdSetItemAttribute(error, "comment", kErrorComment) != 0 ||
+      grdSetItemAncillary(item, error) != 0) {
+    return 1;
+  }
+  return 0;
+}
+
 }  // namespace
 
 namespace {
 
-// Writes the file; with a level source, its levels in increasing order.
+// Writes the file; with level sources, item 1's levels in increasing order,
+// then (when given) the error field's as item 2.
 int writeResult(const char* fileName, const FileDescription& description,
-                std::int32_t itemType, const ResultLevelSource* levels, const char* projection,
+                std::int32_t itemType, const ResultLevelSource* levels,
+                const ResultLevelSource* errorLevels, const char* projection,
                 const TextAttributes* globalAttributes) {
   grdInitSystem();
   GrdHeader* header = nullptr;
-  if (grdHeaderCreate(1, fileName, "", 1, 1, 2, &header) != 0) {
+  if (grdHeaderCreate(errorLevels != nullptr ? 2 : 1, fileName, "", 1, 1, 2, &header) != 0) {
     grdHeaderDestroy(&header);
     return 0;
   }
   GrdFile* file = nullptr;
   if (describeResult(header, description, itemType, projection, globalAttributes) != 0 ||
+      (errorLevels != nullptr && describeErrorItem(header, description, itemType) != 0) ||
       grdFileCreate(fileName, header, &file) != 0) {
     grdHeaderDestroy(&header);
     return 0;
@@ -72,11 +112,15 @@ int writeResult(const char* fileName, const FileDescription& description,
     const std::int32_t nz = description.axes[3].lastIndex + 1;
     std::vector<float> buffer(static_cast<std::size_t>(nx * ny));
     bool written = true;
-    for (std::int32_t s = 0; s < nz && written; ++s) {
-      written = (*levels)(s, buffer.data()) &&
-                grdWriteItemLevel(header, file, s, buffer.data()) == 0;
+    for (int item = 1; item <= (errorLevels != nullptr ? 2 : 1) && written; ++item) {
+      const ResultLevelSource& source = item == 1 ? *levels : *errorLevels;
+      for (std::int32_t s = 0; s < nz && written; ++s) {
+        written = source(s, buffer.data()) &&
+                  grdWriteItemLevel(header, file, s, buffer.data(), item) == 0;
+      }
+      written = written && grdFinishItemTimeStep(header, file, 0.0, item) == 0;
     }
-    if (!written || grdFinishItemTimeStep(header, file, 0.0) != 0) {
+    if (!written) {
       grdFileAbandon(header, &file);
       grdHeaderDestroy(&header);
       return 0;
@@ -87,31 +131,45 @@ int writeResult(const char* fileName, const FileDescription& description,
   return closed == 0 ? 1 : 0;
 }
 
-}  // namespace
-
-int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
-                std::int32_t itemType, const FloatGrid3D& values, const char* projection,
-                const TextAttributes* globalAttributes) {
-  if (writeValues == 0) {
-    return writeResult(fileName, description, itemType, nullptr, projection, globalAttributes);
-  }
-  // The values go level by level, as in a run over several processes, so that
-  // both give the same bytes.
+// The levels of a whole local grid, for the writer.
+ResultLevelSource levelsOf(const FloatGrid3D& values, std::int64_t described) {
   const std::int64_t layer = values.layerSize();
-  const std::int64_t described = std::int64_t{description.axes[1].lastIndex + 1} *
-                                 (description.axes[2].lastIndex + 1);
-  const ResultLevelSource fromGrid = [&values, layer, described](std::int32_t s, float* buffer) {
+  return [&values, layer, described](std::int32_t s, float* buffer) {
     if (values.data == nullptr || layer != described || s < 0 || s >= values.nl) return false;
     std::copy(values.data + s * layer, values.data + (s + 1) * layer, buffer);
     return true;
   };
-  return writeResult(fileName, description, itemType, &fromGrid, projection, globalAttributes);
+}
+
+}  // namespace
+
+int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
+                std::int32_t itemType, const FloatGrid3D& values, const char* projection,
+                const TextAttributes* globalAttributes, const FloatGrid3D* errorValues) {
+  const std::int64_t described = std::int64_t{description.axes[1].lastIndex + 1} *
+                                 (description.axes[2].lastIndex + 1);
+  // The values go level by level, as in a run over several processes, so that
+  // both give the same bytes.
+  const ResultLevelSource fromGrid = levelsOf(values, described);
+  const ResultLevelSource fromErrors =
+      errorValues != nullptr ? levelsOf(*errorValues, described) : ResultLevelSource{};
+  if (writeValues == 0) {
+    // Without values the error item is still described.
+    return writeResult(fileName, description, itemType, nullptr,
+                       errorValues != nullptr ? &fromErrors : nullptr, projection,
+                       globalAttributes);
+  }
+  return writeResult(fileName, description, itemType, &fromGrid,
+                     errorValues != nullptr ? &fromErrors : nullptr, projection,
+                     globalAttributes);
 }
 
 int resultWriteLevels(const char* fileName, const FileDescription& description,
                       std::int32_t itemType, const ResultLevelSource& levels,
-                      const char* projection, const TextAttributes* globalAttributes) {
-  return writeResult(fileName, description, itemType, &levels, projection, globalAttributes);
+                      const char* projection, const TextAttributes* globalAttributes,
+                      const ResultLevelSource* errorLevels) {
+  return writeResult(fileName, description, itemType, &levels, errorLevels, projection,
+                     globalAttributes);
 }
 
 }  // namespace karnet

@@ -17,12 +17,16 @@ struct FloatGrid3D;
 // holds depths below the surface; x and y projection coordinates (a grid
 // parallel to the projection's axes) or distances along the grid's axes (a
 // turned grid); lon and lat every node's position (not for LOCAL); crs the CF
-// grid mapping. globalAttributes (title, history, ...) are added when given. 1 when the file was written and
-// closed, 0 on any failure; a failed write leaves no file under fileName and
-// keeps an earlier file of that name.
+// grid mapping. globalAttributes (title, history, ...) are added when given.
+// With errorValues (the objective analysis' error field, same shape as values)
+// the file gets a second item "<item>_error" that item 1 names as its
+// ancillary variable. 1 when the file was written and closed, 0 on any
+// failure; a failed write leaves no file under fileName and keeps an earlier
+// file of that name.
 int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
                 std::int32_t itemType, const FloatGrid3D& values, const char* projection,
-                const TextAttributes* globalAttributes = nullptr);
+                const TextAttributes* globalAttributes = nullptr,
+                const FloatGrid3D* errorValues = nullptr);
 
 // Hands over local level s (0 for the first level of the result) of the
 // result grid: nx * ny floats, x fastest, into buffer; false when it cannot.
@@ -30,9 +34,11 @@ using ResultLevelSource = std::function<bool(std::int32_t s, float* buffer)>;
 
 // The same file, its values taken level by level from `levels`, first level
 // first, so that the whole grid never needs to be in one place.
+// errorLevels, when given, are the error field's levels, written as item 2.
 int resultWriteLevels(const char* fileName, const FileDescription& description,
                       std::int32_t itemType, const ResultLevelSource& levels,
-                      const char* projection, const TextAttributes* globalAttributes = nullptr);
+                      const char* projection, const TextAttributes* globalAttributes = nullptr,
+                      const ResultLevelSource* errorLevels = nullptr);
 
 }  // namespace karnet
 

@@ -122,6 +122,42 @@ TEST_F(GridFileWrite, RefusedSettingsAndPlaces) {
   EXPECT_NE(grdSetDeleteValFloat(r.header, 0.0f), 0);
 }
 
+// A second item with attributes of its own, named by the first as its
+// ancillary variable, each item written with its own values.
+TEST_F(GridFileWrite, SecondItemWithItsOwnAttributesAndValues) {
+  GrdHeader* header = nullptr;
+  ASSERT_EQ(grdHeaderCreate(2, "unused.nc", "", 1, 1, 2, &header), 0);
+  ASSERT_EQ(grdSetEqTimeAxis(header, 0, 0.0, 1.0, 0), 0);
+  GrdItem* item = grdItemD(header, 1);
+  GrdItem* error = grdItemD(header, 2);
+  ASSERT_EQ(grdSetItemInfo(header, item, 2, "Temperature", 2, 1), 0);
+  ASSERT_EQ(grdSetItemInfo(header, error, 1, "Temperature_error", 0, 1), 0);
+  for (GrdItem* i : {item, error}) {
+    ASSERT_EQ(grdSetItemAxisEqD3(i, 1000, 4, 3, 2, 0.0f, 0.0f, 0.0f, 50.0f, 25.0f, 2.5f), 0);
+  }
+  ASSERT_EQ(grdSetItemAttribute(error, "units", "1"), 0);
+  ASSERT_EQ(grdSetItemAttribute(error, "long_name", "first"), 0);
+  ASSERT_EQ(grdSetItemAttribute(error, "long_name", "relative error"), 0);  // replaced
+  EXPECT_NE(grdSetItemAttribute(error, "_FillValue", "0"), 0);
+  EXPECT_NE(grdSetItemAncillary(item, item), 0);
+  ASSERT_EQ(grdSetItemAncillary(item, error), 0);
+  GrdFile* handle = nullptr;
+  ASSERT_EQ(grdFileCreate(path.c_str(), header, &handle), 0);
+  ASSERT_EQ(grdWriteItemTimeStep(header, handle, 0.0, ramp().data()), 0);
+  EXPECT_NE(grdWriteItemNTimeStep(header, handle, 3, 0.0, ramp().data()), 0);  // no item 3
+  ASSERT_EQ(grdWriteItemNTimeStep(header, handle, 2, 0.0, ramp(100.0f).data()), 0);
+  ASSERT_EQ(grdFileClose(header, &handle), 0);
+  grdHeaderDestroy(&header);
+
+  const std::string dump = test::ncdump(path, "-v Temperature_error");
+  test::expectParts(dump, {"Temperature:ancillary_variables = \"Temperature_error\" ;",
+                           "Temperature_error:units = \"1\" ;",
+                           "Temperature_error:long_name = \"relative error\" ;",
+                           "time = UNLIMITED ; // (1 currently)",
+                           " Temperature_error =\n  100, 100.5, 101, 101.5,"});
+  EXPECT_EQ(dump.find("\"first\""), std::string::npos);
+}
+
 // Until it is closed, a file is not under its name: an earlier file stays,
 // and an abandoned file, one whose header goes first or one that cannot take
 // its name leaves nothing.

@@ -68,6 +68,16 @@ def write_result(path, with_lonlat, empty_level=None):
         if empty_level is not None:
             values[empty_level] = FILL
         t[0] = values
+        # The error field of an objective analysis, linked as karnet links it.
+        t.ancillary_variables = "Temperature_error"
+        e = ds.createVariable("Temperature_error", "f4", ("time", "z", "y", "x"),
+                              fill_value=FILL)
+        e.units = "1"
+        e.long_name = "relative error variance of the Temperature estimate"
+        error = np.clip(0.02 * np.arange(nx)[None, None, :] + 0.1 * np.arange(ny)[None, :, None]
+                        + 0 * np.arange(nz)[:, None, None], 0, 1).astype(np.float32)
+        error[values == FILL] = FILL
+        e[0] = error
 
 
 def write_bathymetry(path):
@@ -189,6 +199,68 @@ class PlotTest(unittest.TestCase):
         write_bathymetry(bathymetry)
         self.plot("bathymetry", bathymetry, "-o", self.path("bathy.png"))
         self.assertGreater(png_colours(self.path("bathy.png")), 50)
+
+    def test_the_error_field_is_drawn_by_map_and_section(self):
+        result = self.path("result.nc")
+        write_result(result, with_lonlat=True)
+        for args in [("map", result, "--var", "Temperature_error", "--level", "3", "-o",
+                      self.path("error_map.png")),
+                     ("section", result, "--var", "Temperature_error", "--column", "4", "-o",
+                      self.path("error_section.png"))]:
+            with self.subTest(args=args[:3]):
+                self.plot(*args)
+                self.assertGreater(png_colours(args[-1]), 50)
+
+    def write(self, name, text):
+        path = self.path(name)
+        with open(path, "w") as f:
+            f.write(text)
+        return path
+
+    def test_cross_validation_tables_are_drawn(self):
+        levels = self.write("case_cv.csv",
+                            "level,depth_m,nodes,missed,rms,bias\n"
+                            "0,100,0,4,,\n"
+                            "1,75,6,1,0.04,0\n"
+                            "2,50,9,0,0.12,-0.02\n"
+                            "3,25,9,0,0.31,0.05\n"
+                            "all,,24,5,0.2,0.01\n")
+        sweep = self.write("case_sweep.csv",
+                           "DecayDistance,ErrorVariance,nodes,missed,rms,bias,best\n"
+                           "1000,5,24,0,0.3,0.01,\n"
+                           "1000,50,24,0,0.25,0.02,*\n"
+                           "2000,5,24,0,0.4,-0.01,\n"
+                           "2000,50,0,24,,,\n")
+        for table in (levels, sweep):
+            with self.subTest(table=os.path.basename(table)):
+                out = table + ".png"
+                self.plot("cv", table, "-o", out)
+                width, height = png_size(out)
+                self.assertGreater(width, 300)
+                self.assertGreater(height, 300)
+                self.assertGreater(png_colours(out), 20)
+        # The best combination stands out in its own colour: drop the mark and the picture
+        # loses it.
+        with open(sweep) as f:
+            unmarked = self.write("unmarked_sweep.csv", f.read().replace(",*", ","))
+        self.plot("cv", unmarked, "-o", self.path("unmarked.png"))
+        self.assertLess(png_colours(self.path("unmarked.png")), png_colours(sweep + ".png"))
+
+    def test_bad_tables_fail_with_a_message(self):
+        for name, text, words in [
+            ("other.csv", "a,b,c\n1,2,3\n", "not a cross-validation table"),
+            ("short.csv", "level,depth_m,nodes,missed,rms,bias\n1,2,3\n", "3 fields"),
+            ("empty.csv", "", "no rows"),
+            ("text.csv", "level,depth_m,nodes,missed,rms,bias\n1,x,3,0,1,1\n",
+             "depth 'x' is not a number"),
+        ]:
+            with self.subTest(table=name):
+                run = self.plot("cv", self.write(name, text), "-o", self.path(name + ".png"),
+                                expect=1)
+                self.assertIn(words, run.stderr)
+                self.assertFalse(os.path.exists(self.path(name + ".png")))
+        run = self.plot("cv", self.path("missing.csv"), "-o", self.path("m.png"), expect=1)
+        self.assertIn("cannot read", run.stderr)
 
     def test_an_all_empty_level_is_drawn_as_a_blank_map(self):
         result = self.path("empty.nc")
