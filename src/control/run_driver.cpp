@@ -163,6 +163,10 @@ void runProgram(const char* parameterFile, const RunInvocation& invocation) {
     if (run.invocation.threads < 1) run.invocation.threads = 1;
     setupRun(parameterFile, run);
     if (run.invocation.crossValidation.active) {
+      // Cross-validation works on every level of the grid in each trial.
+      if (rankCount() > 1) {
+        throw RunError::fatal("ERROR: cross-validation runs in one process: start it without mpirun");
+      }
       crossValidateRun(run, parameterFile);
     } else {
       runDriver(run);

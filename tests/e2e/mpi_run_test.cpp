@@ -115,6 +115,22 @@ TEST_F(MpiRun, InvalidSettingsEndEveryRankWithTheSameMessage) {
   expectSameAsPlain(p, 1);
 }
 
+TEST_F(MpiRun, CrossValidationIsRefusedOverSeveralRanks) {
+  TempDir dir;
+  ParameterFile p;
+  p.projection = "'LOCAL'";
+  p.analysis = "objective";
+  writeSmallCase(dir, p);
+  const ProcessResult run = runProgram(
+      KARNET_MPIEXEC, {"-np", "2", KARNET_BINARY, "--cross-validate", "case.pfs"}, dir.path(),
+      kEnvironment);
+  EXPECT_EQ(run.exitCode, 1);
+  EXPECT_NE(run.err.find("karnet: ERROR: cross-validation runs in one process"), std::string::npos)
+      << run.err;
+  EXPECT_NE(readFile(dir.file("case.log")).find("cross-validation runs in one process"),
+            std::string::npos);
+}
+
 // The process of rank 0 of the job working in dir, or 0.
 int rankZeroIn(const std::string& dir) {
   std::error_code ignored;
