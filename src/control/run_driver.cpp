@@ -10,6 +10,8 @@
 #include "control/log.h"
 #include "control/progress.h"
 #include "control/cross_validate_run.h"
+#include "control/ranked_result.h"
+#include "control/ranks.h"
 #include "control/run_summary.h"
 #include "control/signals.h"
 #include "control/termination.h"
@@ -95,11 +97,25 @@ int runPhases(Run& run, RunSummary* summary) {
   if (settings.Analysis == 0) {
     errorField = state.localValues;
     errorField.data = nullptr;
+    // Each process holds the error field of its own levels.
+    const LevelRange held =
+        state.heldSteps(lOff, std::int64_t{settings.lx} - settings.l0 + 1);
+    errorField.l0 = settings.l0 + held.first;
+    errorField.nl = held.count;
+    errorField.total = state.localValues.layerSize() * held.count;
     grid3DAlloc(errorField);
     grid3DFill(errorField, static_cast<float>(state.deleteValue()));
     objectiveAnalysis(lastObs, jOff, kOff, lOff, state, context, &errorField);
   } else {
     interp(lastObs, jOff, kOff, lOff, state, context);
+  }
+  // Over several processes the levels meet only in the result file.
+  if (rankCount() > 1) {
+    const int written = writeRankedResult(run.invocation, state, parameters, settings, tally,
+                                          errorField.data != nullptr ? &errorField : nullptr,
+                                          summary);
+    if (errorField.data != nullptr) grid3DFree(errorField);
+    return written;
   }
   glo2loc(jOff, kOff, lOff, state, settings);
   if (summary != nullptr) {
@@ -129,11 +145,14 @@ void runDriver(Run& run) {
   installSignalHandlers();
   runInitialise(run.state, contextOf(run));
   RunSummary summary;
-  // A run whose result could not be written has not produced what it was for.
-  if (runPhases(run, &summary) == 0) throw RunError::logged("\nERROR while writing result file\n");
+  const int written = runPhases(run, &summary);
+  // A run whose result could not be written has not produced what it was for;
+  // every process of the run ends as the one that wrote it.
+  const std::int32_t failed = ranksAgreeOnEnd(written == 0 ? 1 : -1);
+  if (failed >= 0) throw RunError::logged("\nERROR while writing result file\n", failed);
   freeRunArrays(run.state);
   restoreSignalHandlers();
-  printRunSummary(stderr, summary, run.invocation.quiet);
+  if (rankLeads()) printRunSummary(stderr, summary, run.invocation.quiet);
 }
 
 void runProgram(const char* parameterFile, const RunInvocation& invocation) {
@@ -144,6 +163,10 @@ void runProgram(const char* parameterFile, const RunInvocation& invocation) {
     if (run.invocation.threads < 1) run.invocation.threads = 1;
     setupRun(parameterFile, run);
     if (run.invocation.crossValidation.active) {
+      // Cross-validation works on every level of the grid in each trial.
+      if (rankCount() > 1) {
+        throw RunError::fatal("ERROR: cross-validation runs in one process: start it without mpirun");
+      }
       crossValidateRun(run, parameterFile);
     } else {
       runDriver(run);
