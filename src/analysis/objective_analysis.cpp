@@ -21,6 +21,7 @@
 #include "analysis/select_data.h"
 #include "control/log.h"
 #include "control/progress.h"
+#include "control/ranks.h"
 #include "control/threads.h"
 #include "interp/node_tests.h"
 #include "interp/setadj.h"
@@ -294,9 +295,12 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
 
   // One unit per footprint node of every layer.
   const std::int64_t layerCount = std::max<std::int64_t>(std::int64_t{lLast} - lOff + 1, 0);
+  // Only the levels this process holds (all of them when it runs alone), and
+  // progress over them.
+  const LevelRange held = state.heldSteps(lOff, layerCount);
   WorkProgress progress((std::int64_t{jLast} - jOff + 1) * (std::int64_t{kLast} - kOff + 1) *
-                        layerCount);
-  const ThreadShare share = shareThreads(context.threads, layerCount);
+                        held.count);
+  const ThreadShare share = shareThreads(context.threads, std::max<std::int64_t>(held.count, 1));
   allowNestedTeams();
   std::vector<LayerOutcome> outcomes(static_cast<std::size_t>(layerCount));
 
@@ -304,7 +308,7 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
   {
     std::optional<LayerWorkspace> ws;
 #pragma omp for schedule(dynamic, 1) nowait
-    for (std::int64_t s = 0; s < layerCount; ++s) {
+    for (std::int64_t s = held.first; s < held.end(); ++s) {
       if (progress.stopped()) {
         progress.itemDone();
         continue;
@@ -325,7 +329,8 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
         input.deleteValue = deleteValue;
         input.jOff = jOff;
         input.kOff = kOff;
-        input.lOff = lOff;
+        // The error field holds the levels this process holds, from its first.
+        input.lOff = lOff + held.first;
         input.errorField = errorField;
         LayerTeam team;
         team.threads = share.rows;
@@ -350,7 +355,7 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
       progress.itemDone();
       progress.poll();
     }
-    progress.watchUntilDone(layerCount);
+    progress.watchUntilDone(held.count);
   }
   progress.finish();
 
@@ -365,6 +370,13 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
     if (!outcome.messages.empty()) std::fputs(outcome.messages.c_str(), stdout);
   }
   std::fflush(stdout);
+
+  // The counts of every process's levels.
+  std::int64_t sums[3] = {dataCells, interpolations, failures};
+  ranksSum(sums, 3);
+  dataCells = sums[0];
+  interpolations = sums[1];
+  failures = sums[2];
 
   Report& report = context.report;
   report.printf("\n");

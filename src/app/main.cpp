@@ -12,6 +12,7 @@
 #include "control/cross_validate_run.h"
 #include "control/host.h"
 #include "control/log.h"
+#include "control/ranks.h"
 #include "control/run_driver.h"
 #include "control/termination.h"
 #include "control/threads.h"
@@ -81,7 +82,10 @@ karnet::CrossValidationRequest crossValidation;
 
   char logFileName[karnet::kFileNameSize];
   std::FILE* log = nullptr;
-  if (karnet::makeLogFileName(parameterFile, logFileName) != 0) {
+  if (!karnet::rankLeads()) {
+    // In a run over several processes the first one keeps the log.
+    log = std::fopen("/dev/null", "w");
+  } else if (karnet::makeLogFileName(parameterFile, logFileName) != 0) {
     log = std::fopen(logFileName, "w");
   }
   // Line-buffered, so that a user (or a script) following the log sees each
@@ -117,16 +121,31 @@ bool answerInformationRequest(int count, char** arguments) {
 }  // namespace
 
 int main(int argc, char** argv) {
+  // Under an MPI launcher every process is one rank of the run; the first
+  // speaks for all of them: the others' messages and progress go nowhere.
+  karnet::ranksInit(&argc, &argv);
+  if (!karnet::ranksAvailable() && karnet::ranksLaunchedCount() > 1) {
+    // Each process would make the whole run and write the same files.
+    std::fputs("karnet: this karnet was built without MPI (CMake option KARNET_MPI): run it "
+               "without mpirun, or build it with MPI\n", stderr);
+    return 1;
+  }
   // The platform hands the arguments already split; the program's own name is
   // not one of them.
   argumentCount = argc > 0 ? argc - 1 : 0;
   if (argc > 0 && argv[0] != nullptr) programPath = argv[0];
   argumentVector = argc > 0 ? argv + 1 : argv;
 
+  if (!karnet::ranksQuietFollower()) karnet::ranksAbort(1);
+  // Every rank runs in the mode asked for, so that a cancel (SIGUSR1, which
+  // mpirun passes on to all of them) reaches each.
   const bool hostMode = karnet::hasHostModeArgument(argumentCount, argumentVector);
   setenv("H84", hostMode ? "APV" : "WIN", 1);
 
-  if (answerInformationRequest(argumentCount, argumentVector)) return 0;
+  if (answerInformationRequest(argumentCount, argumentVector)) {
+    karnet::ranksFinish();
+    return 0;
+  }
 
   std::string problem;
   if (!karnet::takeCrossValidationArguments(argumentCount, argumentVector, crossValidation,

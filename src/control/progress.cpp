@@ -7,6 +7,7 @@
 #include <ctime>
 
 #include "control/host.h"
+#include "control/ranks.h"
 #include "control/signals.h"
 #include "support/run_error.h"
 
@@ -63,7 +64,12 @@ void progressReport(std::int64_t done) {
 
 int progressCheckCancel() {
   handlePendingSignal();
-  if (apvCancel() != 0) throw RunError::cancelled();
+  // A cancel asked for on the first rank of a run over several reaches the
+  // others here; each then ends as the first does.
+  if (apvCancel() != 0 || ranksCancelAnnounced()) {
+    ranksAnnounceCancel();
+    throw RunError::cancelled();
+  }
   return 0;
 }
 

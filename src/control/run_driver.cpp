@@ -10,6 +10,8 @@
 #include "control/log.h"
 #include "control/progress.h"
 #include "control/cross_validate_run.h"
+#include "control/ranked_result.h"
+#include "control/ranks.h"
 #include "control/run_summary.h"
 #include "control/signals.h"
 #include "control/termination.h"
@@ -101,11 +103,25 @@ int runPhases(Run& run, RunSummary* summary, std::string* writeProblem) {
   if (settings.Analysis == 0) {
     errorField = state.localValues;
     errorField.data = nullptr;
+    // Each process holds the error field of its own levels.
+    const LevelRange held =
+        state.heldSteps(lOff, std::int64_t{settings.lx} - settings.l0 + 1);
+    errorField.l0 = settings.l0 + held.first;
+    errorField.nl = held.count;
+    errorField.total = state.localValues.layerSize() * held.count;
     grid3DAlloc(errorField);
     grid3DFill(errorField, static_cast<float>(state.deleteValue()));
     objectiveAnalysis(lastObs, jOff, kOff, lOff, state, context, &errorField);
   } else {
     interp(lastObs, jOff, kOff, lOff, state, context);
+  }
+  // Over several processes the levels meet only in the result file.
+  if (rankCount() > 1) {
+    const int written = writeRankedResult(run.invocation, state, parameters, settings, tally,
+                                          errorField.data != nullptr ? &errorField : nullptr,
+                                          summary, writeProblem);
+    if (errorField.data != nullptr) grid3DFree(errorField);
+    return written;
   }
   glo2loc(jOff, kOff, lOff, state, settings);
   if (summary != nullptr) {
@@ -135,15 +151,23 @@ void runDriver(Run& run) {
   installSignalHandlers();
   runInitialise(run.state, contextOf(run));
   RunSummary summary;
-  // A run whose result could not be written has not produced what it was for.
   std::string writeProblem;
-  if (runPhases(run, &summary, &writeProblem) == 0) {
-    throw RunError::logged("\nERROR while writing result file\n")
-        .withNotice(fileNotice(run.parameters.outputData.FileName, writeProblem));
+  const int written = runPhases(run, &summary, &writeProblem);
+  // A run whose result could not be written has not produced what it was for;
+  // every process of the run ends as the one that wrote it, which also names
+  // the file and why.
+  const std::int32_t failed = ranksAgreeOnEnd(written == 0 ? 1 : -1);
+  if (failed >= 0) {
+    RunError error = RunError::logged("\nERROR while writing result file\n", failed);
+    if (written == 0) {
+      throw std::move(error).withNotice(
+          fileNotice(run.parameters.outputData.FileName, writeProblem));
+    }
+    throw error;
   }
   freeRunArrays(run.state);
   restoreSignalHandlers();
-  printRunSummary(stderr, summary, run.invocation.quiet);
+  if (rankLeads()) printRunSummary(stderr, summary, run.invocation.quiet);
 }
 
 void runProgram(const char* parameterFile, const RunInvocation& invocation) {
@@ -154,6 +178,10 @@ void runProgram(const char* parameterFile, const RunInvocation& invocation) {
     if (run.invocation.threads < 1) run.invocation.threads = 1;
     setupRun(parameterFile, run);
     if (run.invocation.crossValidation.active) {
+      // Cross-validation works on every level of the grid in each trial.
+      if (rankCount() > 1) {
+        throw RunError::fatal("ERROR: cross-validation runs in one process: start it without mpirun");
+      }
       crossValidateRun(run, parameterFile);
     } else {
       runDriver(run);

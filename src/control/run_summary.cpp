@@ -8,6 +8,19 @@
 
 namespace karnet {
 
+void countResultLevel(const FloatGrid2D& bed, double landValue, const RunSettings& s,
+                      std::int32_t l, const float* layer, RunSummary* summary) {
+  const std::int64_t columns = std::int64_t{bed.nj} * bed.nk;
+  const bool top = l == s.lx;
+  const float height = static_cast<float>(l - s.lx - 1) * s.dz;
+  for (std::int64_t c = 0; c < columns; ++c) {
+    const float b = bed.data[c];
+    if (!(landValue > static_cast<double>(b)) || !(top || height > b)) continue;
+    ++summary->wetNodes;
+    if (layer[c] != kDeleteValueFloat) ++summary->estimatedNodes;
+  }
+}
+
 void countResultNodes(const FloatGrid2D& bed, double landValue, const RunSettings& s,
                       const FloatGrid3D& values, RunSummary* summary) {
   summary->nx = values.nj;
@@ -19,16 +32,7 @@ void countResultNodes(const FloatGrid2D& bed, double landValue, const RunSetting
   const std::int64_t columns = std::int64_t{bed.nj} * bed.nk;
   // Layer by layer in memory order; local level l0 + n is layer n.
   for (std::int32_t n = 0; n < values.nl; ++n) {
-    const std::int32_t l = s.l0 + n;
-    const bool top = l == s.lx;
-    const float height = static_cast<float>(l - s.lx - 1) * s.dz;
-    const float* layer = values.data + n * columns;
-    for (std::int64_t c = 0; c < columns; ++c) {
-      const float b = bed.data[c];
-      if (!(landValue > static_cast<double>(b)) || !(top || height > b)) continue;
-      ++summary->wetNodes;
-      if (layer[c] != kDeleteValueFloat) ++summary->estimatedNodes;
-    }
+    countResultLevel(bed, landValue, s, s.l0 + n, values.data + n * columns, summary);
   }
 }
 

@@ -33,6 +33,11 @@ inline constexpr double kInsideShareWarning = 0.05;
 void countResultNodes(const FloatGrid2D& bed, double landValue, const RunSettings& settings,
                       const FloatGrid3D& values, RunSummary* summary);
 
+// Adds the wet nodes of local level l (the nodes of layer, x fastest, as
+// many as bed has) and those of them that hold a value to the summary's counts.
+void countResultLevel(const FloatGrid2D& bed, double landValue, const RunSettings& settings,
+                      std::int32_t l, const float* layer, RunSummary* summary);
+
 // Writes the summary lines ("karnet: ..."): the result, the grid and the
 // observations (not when quiet), and the warning when few observations lie
 // inside the grid (always).

@@ -12,6 +12,7 @@
 
 #include "control/host.h"
 #include "control/log.h"
+#include "control/ranks.h"
 
 namespace karnet {
 namespace {
@@ -41,6 +42,9 @@ void finishRun(std::int32_t exitCode, bool inSignal) {
     logClose();
   }
   apvShutdown();
+  // A run over several processes leaves its job together when all of them
+  // agreed on the end; otherwise the launcher ends the others.
+  if (!inSignal) ranksEnd(exitCode);
 }
 
 // Logs the message and shows it to the user unless the environment says not to.

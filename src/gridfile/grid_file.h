@@ -105,6 +105,12 @@ int grdWriteItemTimeStep(GrdHeader* header, GrdFile* file, double time, const fl
 // Writes the next time step of item itemNumber (from 1; item 1 as above).
 int grdWriteItemNTimeStep(GrdHeader* header, GrdFile* file, int itemNumber, double time,
                           const float* data);
+// The same time step level by level: grdWriteItemLevel stores z level `level`
+// (x fastest, then y) of the step of item itemNumber being written, in any
+// order, and grdFinishItemTimeStep then sets the step's time and closes it.
+int grdWriteItemLevel(GrdHeader* header, GrdFile* file, std::int32_t level, const float* data,
+                      int itemNumber = 1);
+int grdFinishItemTimeStep(GrdHeader* header, GrdFile* file, double time, int itemNumber = 1);
 // Closes the file; a complete file is renamed to its final name. Sets *file to null.
 // reason, when given, says why the file could not be put in place.
 int grdFileClose(GrdHeader* header, GrdFile** file, std::string* reason = nullptr);

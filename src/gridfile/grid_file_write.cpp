@@ -610,6 +610,55 @@ int grdWriteItemNTimeStep(GrdHeader* header, GrdFile* file, int itemNumber, doub
   return 0;
 }
 
+int grdWriteItemLevel(GrdHeader* header, GrdFile* file, std::int32_t level, const float* data,
+                      int itemNumber) {
+  if (!validOpenFile(header, file) || data == nullptr) return 1;
+  if (itemNumber < 1 || static_cast<std::size_t>(itemNumber) > file->itemVars.size()) return 1;
+  const auto n = static_cast<std::size_t>(itemNumber - 1);
+  const std::size_t step = file->itemSteps[n];
+  if (file->failed || (!file->hasTime && step > 0)) return 1;
+  const GrdItem& item = *header->items[n];
+  if (item.axisDims != 3 || level < 0 || level >= item.counts[2]) return 1;
+  std::vector<std::size_t> start;
+  std::vector<std::size_t> count;
+  if (file->hasTime) {
+    start.push_back(step);
+    count.push_back(1);
+  }
+  start.push_back(static_cast<std::size_t>(level));
+  count.push_back(1);
+  for (int d = 1; d >= 0; --d) {
+    start.push_back(0);
+    count.push_back(static_cast<std::size_t>(item.counts[d]));
+  }
+  NcStatus status;
+  status(nc_put_vara_float(file->ncid, file->itemVars[n], start.data(), count.data(), data));
+  if (!status.ok()) {
+    file->failed = true;
+    return 1;
+  }
+  return 0;
+}
+
+int grdFinishItemTimeStep(GrdHeader* header, GrdFile* file, double time, int itemNumber) {
+  if (!validOpenFile(header, file)) return 1;
+  if (itemNumber < 1 || static_cast<std::size_t>(itemNumber) > file->itemVars.size()) return 1;
+  const auto n = static_cast<std::size_t>(itemNumber - 1);
+  const std::size_t step = file->itemSteps[n];
+  if (file->failed || (!file->hasTime && step > 0)) return 1;
+  if (file->hasTime) {
+    NcStatus status;
+    status(nc_put_var1_double(file->ncid, file->timeVar, &step, &time));
+    if (!status.ok()) {
+      file->failed = true;
+      return 1;
+    }
+  }
+  file->itemSteps[n] = step + 1;
+  file->stepsWritten = std::max(file->stepsWritten, step + 1);
+  return 0;
+}
+
 int grdFileClose(GrdHeader* header, GrdFile** file, std::string* reason) {
   if (file == nullptr || *file == nullptr) return 1;
   if (!validOpenFile(header, *file)) return 1;

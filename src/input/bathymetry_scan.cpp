@@ -17,6 +17,8 @@ void bathymetryScan(std::int32_t jOff, std::int32_t kOff, std::int32_t lOff, Run
     const bool top = l == s.lx;
     const float height = static_cast<float>(l - s.lx - 1) * s.dz;
     const std::int32_t lb = l - s.l0 + lOff;
+    // Only the levels this process holds.
+    if (lb < basic.l0 || lb >= basic.l0 + basic.nl) continue;
     for (std::int32_t j = 0; j < bed.nk; ++j) {
       const float* row = bed.data + std::int64_t{j} * bed.nj;
       float* out = &basic.at(jOff, j + kOff, lb);

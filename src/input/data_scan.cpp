@@ -11,8 +11,10 @@
 
 #include "control/log.h"
 #include "control/progress.h"
+#include "control/ranks.h"
 #include "input/bathymetry_read.h"
 #include "input/cartography.h"
+#include "input/level_share.h"
 #include "input/observation_line.h"
 #include "params/run_settings.h"
 #include "state/run_context.h"
@@ -261,11 +263,19 @@ void dataScan(RunState& state, const RunContext& context, const char* bathymetry
                         ax.count * ay.count > kMaxCount ||
                         ax.count * ay.count * az.count > kMaxCount;
   if (tooLarge) stopScan(state, "\nERROR: basic grid too large\n");
-  // The four basic-grid fields come on top of what is already held; a request
-  // that cannot be met stops here, before anything is allocated.
+  // Each process holds the levels it works on; alone, it holds them all.
+  const LevelRange share = shareBasicLevels(
+      state, s, static_cast<std::int32_t>(az.count), static_cast<std::int32_t>(ax.offset),
+      static_cast<std::int32_t>(ay.offset), static_cast<std::int32_t>(az.offset), rankCount(),
+      rankIndex());
+  // The four basic-grid fields (of the levels held) come on top of what is
+  // already held; a request that cannot be met stops here, before anything is
+  // allocated.
   const std::uint64_t layer = byteSize(static_cast<std::uint64_t>(ax.count * ay.count), 4);
-  const std::uint64_t volume = byteSize(layer, static_cast<std::uint64_t>(az.count));
-  const std::uint64_t held = byteSize(static_cast<std::uint64_t>(state.localValues.total), 4) +
+  const std::uint64_t volume = byteSize(layer, static_cast<std::uint64_t>(share.count));
+  const std::uint64_t localBytes =
+      state.localValues.data != nullptr ? static_cast<std::uint64_t>(state.localValues.total) : 0;
+  const std::uint64_t held = byteSize(localBytes, 4) +
                              byteSize(static_cast<std::uint64_t>(state.scatter.capacity), 32);
   const std::uint64_t needed = 2 * volume + 2 * layer + held;
   const std::uint64_t limit = memoryLimitBytes();
@@ -308,9 +318,10 @@ void dataScan(RunState& state, const RunContext& context, const char* bathymetry
     *g = FloatGrid3D{};
     g->nj = nj;
     g->nk = nk;
-    g->nl = nl;
-    g->total = std::int64_t{nj} * nk * nl;
-    grid3DAlloc(*g);
+    g->l0 = share.first;
+    g->nl = share.count;
+    g->total = std::int64_t{nj} * nk * share.count;
+    if (g->total > 0) grid3DAlloc(*g);
   }
 
   report.write("\nBasic grid parameters:\n");

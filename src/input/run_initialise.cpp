@@ -7,6 +7,7 @@
 
 #include "control/log.h"
 #include "control/progress.h"
+#include "control/ranks.h"
 #include "input/cartography.h"
 #include "params/run_settings.h"
 #include "state/run_context.h"
@@ -140,7 +141,9 @@ void runInitialise(RunState& state, const RunContext& context) {
   local.nl = static_cast<std::int32_t>(nl);
   local.unitJ = local.unitK = local.unitL = 1;
   local.total = nj * nk * nl;
-  grid3DAlloc(local);
+  // Over several processes no process holds the whole result: its levels go
+  // from the process that holds them to the result file.
+  if (rankCount() == 1) grid3DAlloc(local);
 }
 
 }  // namespace karnet

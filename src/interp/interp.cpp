@@ -18,6 +18,7 @@
 
 #include "control/log.h"
 #include "control/progress.h"
+#include "control/ranks.h"
 #include "control/threads.h"
 #include "interp/bilin.h"
 #include "interp/meanw.h"
@@ -222,11 +223,14 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
   // One work unit per footprint node of a layer (as the nodes less one per
   // axis were counted before, so a layer's share stays the same).
   const std::int64_t layerUnits = spanK * spanJ;
-  WorkProgress progress(layerUnits * spanL);
+  // Only the levels this process holds (all of them when it runs alone), and
+  // progress over them.
+  const LevelRange held = state.heldSteps(lOff, spanL + 1);
+  WorkProgress progress(layerUnits * (held.count > 0 ? held.count - 1 : 0));
   pass.progress = &progress;
 
   const std::int64_t layerCount = spanL + 1;
-  const ThreadShare share = shareThreads(context.threads, layerCount);
+  const ThreadShare share = shareThreads(context.threads, std::max<std::int64_t>(held.count, 1));
   pass.rowThreads = share.rows;
   allowNestedTeams();
   std::vector<InterpolationCounts> counts(static_cast<std::size_t>(std::max<std::int64_t>(layerCount, 0)));
@@ -235,13 +239,14 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
   {
     std::optional<LayerWorkspace> ws;
 #pragma omp for schedule(dynamic, 1) nowait
-    for (std::int64_t s = 0; s < layerCount; ++s) {
+    for (std::int64_t s = held.first; s < held.end(); ++s) {
       if (progress.stopped()) {
         progress.itemDone();
         continue;
       }
       const std::int64_t lb = lOff + s;
-      const bool inside = lb >= 0 && lb < values.nl && lb < bathymetry.nl &&
+      const bool inside = lb >= values.l0 && lb < values.l0 + values.nl &&
+                          lb >= bathymetry.l0 && lb < bathymetry.l0 + bathymetry.nl &&
                           values.layerSize() == bathymetry.layerSize();
       if (inside) {
         try {
@@ -256,7 +261,7 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
       progress.itemDone();
       progress.poll();
     }
-    progress.watchUntilDone(layerCount);
+    progress.watchUntilDone(held.count);
   }
   progress.finish();
 
@@ -266,6 +271,10 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
     total.weighted += layer.weighted;
     total.none += layer.none;
   }
+  // The counts of every process's levels.
+  std::int64_t sums[3] = {total.bilinear, total.weighted, total.none};
+  ranksSum(sums, 3);
+  total = InterpolationCounts{sums[0], sums[1], sums[2]};
   writeStatistics(context.report, total);
 }
 

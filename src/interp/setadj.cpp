@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstdint>
+#include <vector>
 
 #include "control/progress.h"
 #include "interp/node_tests.h"
@@ -125,70 +126,87 @@ void setadj(std::int32_t lastObs, RunState& state, const RunSettings& settings) 
   const FloatGrid3D& bathymetry = state.basicBathymetry;
   const double deleteValue = state.deleteValue();
   const double landValue = state.landValue;
+  const float emptyValue = static_cast<float>(deleteValue);
   const std::int32_t nj = values.nj;
   const std::int32_t nk = values.nk;
-  const std::int32_t nl = values.nl;
-  const std::int64_t layerSize = values.layerSize();
-  const std::int64_t nodeCount = layerSize * nl;
+  const std::int32_t nl = state.basicLevelCount();
+  const bool wholeColumns = state.holdsAllLevels();
+  grid3DFill(values, emptyValue);
 
-  // Per-node observation counts, later per-column data-level counts (layer 0).
-  FloatGrid3D count;
-  count.nj = nj;
-  count.nk = nk;
-  count.nl = nl;
-  count.total = values.total;
-  grid3DAlloc(count);
-  grid3DFill(count, 0.0f);
-  grid3DFill(values, static_cast<float>(deleteValue));
+  // Observations land on few nodes of a large grid: the binned nodes are kept
+  // as a list sorted by column, then level, and each column holding data is
+  // completed in a buffer of its own. This process then keeps the levels it
+  // holds, so that a run over several processes never needs whole columns.
+  struct Binned {
+    std::int64_t node;  // (k * nj + j) * nl + l
+    std::int32_t observation;
+  };
+  std::vector<Binned> binned;
+  binned.reserve(static_cast<std::size_t>(std::max<std::int32_t>(lastObs + 1, 0)));
 
-  const std::int64_t progressTotal = (2 * std::int64_t{nl} + 1) * nk * nj + lastObs;
+  const std::int64_t progressTotal = std::int64_t{lastObs} + 1 + 2 * std::int64_t{nj} * nk;
   progressStart(progressTotal);
   ProgressTicker progress(progressTotal);
 
-  // Phase 1: binning, sums formed in double and rounded back at every step.
+  // Phase 1: binning to the nearest node.
   const ScatterData& scatter = state.scatter;
   for (std::int32_t i = 0; i <= lastObs; ++i) {
     std::int32_t j = 0, k = 0, l = 0;
     if (nearestNode(scatter.x[i], nj, j) && nearestNode(scatter.y[i], nk, k) &&
         nearestNode(scatter.z[i], nl, l)) {
-      const std::int64_t at = (std::int64_t{l} * nk + k) * nj + j;
-      if (count.data[at] == 0.0f) values.data[at] = 0.0f;
-      values.data[at] =
-          static_cast<float>(static_cast<double>(values.data[at]) + scatter.value[i]);
-      count.data[at] += 1.0f;
+      binned.push_back(Binned{(std::int64_t{k} * nj + j) * nl + l, i});
     }
     progress.tick();
   }
+  // Observations of one node stay in file order: their sum is rounded to a
+  // float after every addition, so the order is part of the result.
+  std::stable_sort(binned.begin(), binned.end(),
+                   [](const Binned& a, const Binned& b) { return a.node < b.node; });
 
-  // Phase 2: averaging. Each node is independent, so memory order is used.
-  for (std::int64_t at = 0; at < nodeCount; ++at) {
-    if (count.data[at] != 0.0f) values.data[at] = values.data[at] / count.data[at];
-    progress.tick();
-  }
+  std::vector<float> column(static_cast<std::size_t>(nl));
+  std::vector<float> bed(static_cast<std::size_t>(nl));
+  const std::int64_t layerSize = std::int64_t{nj} * nk;
+  const std::int32_t heldFirst = values.l0;
+  const std::int32_t heldEnd = values.l0 + values.nl;
+  std::size_t next = 0;
+  while (next < binned.size()) {
+    const std::int64_t columnIndex = binned[next].node / nl;
+    std::fill(column.begin(), column.end(), emptyValue);
 
-  // Phase 3: number of data levels per column, kept in layer 0 of the count field.
-  grid3DFill(count, 0.0f);
-  for (std::int32_t l = 0; l < nl; ++l) {
-    const float* layer = values.data + l * layerSize;
-    for (std::int64_t at = 0; at < layerSize; ++at) {
-      if (!isEmptyCell(layer[at], deleteValue)) count.data[at] += 1.0f;
-      progress.tick();
-    }
-  }
-
-  // Phase 4: vertical completion, column by column (columns are independent).
-  for (std::int32_t k = 0; k < nk; ++k) {
-    for (std::int32_t j = 0; j < nj; ++j) {
-      const std::int64_t base = std::int64_t{k} * nj + j;
-      if (count.data[base] != 0.0f) {
-        const Column column{values.data + base, bathymetry.data + base, layerSize, nl};
-        completeColumn(column, deleteValue, landValue, settings);
+    // Phase 2: the mean of each node's observations, summed in double and
+    // rounded back at every step, divided in single precision.
+    bool hasData = false;
+    while (next < binned.size() && binned[next].node / nl == columnIndex) {
+      const std::int64_t node = binned[next].node;
+      float sum = 0.0f;
+      float count = 0.0f;
+      for (; next < binned.size() && binned[next].node == node; ++next) {
+        sum = static_cast<float>(static_cast<double>(sum) + scatter.value[binned[next].observation]);
+        count += 1.0f;
       }
-      progress.tick();
+      const float mean = sum / count;
+      column[static_cast<std::size_t>(node % nl)] = mean;
+      if (!isEmptyCell(mean, deleteValue)) hasData = true;
     }
-  }
+    progress.tick();
 
-  grid3DFree(count);
+    // Phase 3: vertical completion of a column that holds data.
+    const auto k = static_cast<std::int32_t>(columnIndex / nj);
+    const auto j = static_cast<std::int32_t>(columnIndex % nj);
+    if (hasData) {
+      for (std::int32_t l = 0; l < nl; ++l) {
+        bed[static_cast<std::size_t>(l)] =
+            wholeColumns ? bathymetry.data[l * layerSize + columnIndex]
+                         : basicBedAt(state.bathymetryGrid, landValue, state.window, j, k, l);
+      }
+      const Column c{column.data(), bed.data(), 1, nl};
+      completeColumn(c, deleteValue, landValue, settings);
+    }
+    for (std::int32_t l = std::max(heldFirst, 0); l < std::min(heldEnd, nl); ++l) {
+      values.at(j, k, l) = column[static_cast<std::size_t>(l)];
+    }
+    progress.tick();
+  }
 }
 
 }  // namespace karnet

@@ -1,6 +1,8 @@
 #include "output/result_write.h"
 
+#include <algorithm>
 #include <string>
+#include <vector>
 
 #include "gridfile/grid_file.h"
 #include "gridfile/units.h"
@@ -83,22 +85,26 @@ int describeErrorItem(GrdHeader* header, const FileDescription& d, std::int32_t 
 
 }  // namespace
 
-int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
-                std::int32_t itemType, const FloatGrid3D& values, const char* projection,
-                const TextAttributes* globalAttributes, const FloatGrid3D* errorValues,
-                std::string* reason) {
+namespace {
+
+// Writes the file; with level sources, item 1's levels in increasing order,
+// then (when given) the error field's as item 2.
+int writeResult(const char* fileName, const FileDescription& description,
+                std::int32_t itemType, const ResultLevelSource* levels,
+                const ResultLevelSource* errorLevels, const char* projection,
+                const TextAttributes* globalAttributes, std::string* reason) {
   std::string ignored;
   if (reason == nullptr) reason = &ignored;
   grdInitSystem();
   GrdHeader* header = nullptr;
-  if (grdHeaderCreate(errorValues != nullptr ? 2 : 1, fileName, "", 1, 1, 2, &header) != 0) {
+  if (grdHeaderCreate(errorLevels != nullptr ? 2 : 1, fileName, "", 1, 1, 2, &header) != 0) {
     grdHeaderDestroy(&header);
     *reason = "cannot be described";
     return 0;
   }
   GrdFile* file = nullptr;
   if (describeResult(header, description, itemType, projection, globalAttributes) != 0 ||
-      (errorValues != nullptr && describeErrorItem(header, description, itemType) != 0)) {
+      (errorLevels != nullptr && describeErrorItem(header, description, itemType) != 0)) {
     grdHeaderDestroy(&header);
     *reason = "its layout cannot be described (axes, projection or attributes)";
     return 0;
@@ -109,18 +115,72 @@ int resultWrite(const char* fileName, const FileDescription& description, int wr
     if (reason->empty()) *reason = "cannot be created";
     return 0;
   }
-  if (writeValues != 0 &&
-      (grdWriteItemTimeStep(header, file, 0.0, values.data) != 0 ||
-       (errorValues != nullptr &&
-        grdWriteItemNTimeStep(header, file, 2, 0.0, errorValues->data) != 0))) {
-    grdFileAbandon(header, &file);
-    grdHeaderDestroy(&header);
-    *reason = "its values cannot be written";
-    return 0;
+  if (levels != nullptr) {
+    const std::int64_t nx = description.axes[1].lastIndex + 1;
+    const std::int64_t ny = description.axes[2].lastIndex + 1;
+    const std::int32_t nz = description.axes[3].lastIndex + 1;
+    std::vector<float> buffer(static_cast<std::size_t>(nx * ny));
+    bool written = true;
+    for (int item = 1; item <= (errorLevels != nullptr ? 2 : 1) && written; ++item) {
+      const ResultLevelSource& source = item == 1 ? *levels : *errorLevels;
+      for (std::int32_t s = 0; s < nz && written; ++s) {
+        written = source(s, buffer.data()) &&
+                  grdWriteItemLevel(header, file, s, buffer.data(), item) == 0;
+      }
+      written = written && grdFinishItemTimeStep(header, file, 0.0, item) == 0;
+    }
+    if (!written) {
+      grdFileAbandon(header, &file);
+      grdHeaderDestroy(&header);
+      *reason = "its values cannot be written";
+      return 0;
+    }
   }
   const int closed = grdFileClose(header, &file, reason);
   grdHeaderDestroy(&header);
   return closed == 0 ? 1 : 0;
+}
+
+// The levels of a whole local grid, for the writer.
+ResultLevelSource levelsOf(const FloatGrid3D& values, std::int64_t described) {
+  const std::int64_t layer = values.layerSize();
+  return [&values, layer, described](std::int32_t s, float* buffer) {
+    if (values.data == nullptr || layer != described || s < 0 || s >= values.nl) return false;
+    std::copy(values.data + s * layer, values.data + (s + 1) * layer, buffer);
+    return true;
+  };
+}
+
+}  // namespace
+
+int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
+                std::int32_t itemType, const FloatGrid3D& values, const char* projection,
+                const TextAttributes* globalAttributes, const FloatGrid3D* errorValues,
+                std::string* reason) {
+  const std::int64_t described = std::int64_t{description.axes[1].lastIndex + 1} *
+                                 (description.axes[2].lastIndex + 1);
+  // The values go level by level, as in a run over several processes, so that
+  // both give the same bytes.
+  const ResultLevelSource fromGrid = levelsOf(values, described);
+  const ResultLevelSource fromErrors =
+      errorValues != nullptr ? levelsOf(*errorValues, described) : ResultLevelSource{};
+  if (writeValues == 0) {
+    // Without values the error item is still described.
+    return writeResult(fileName, description, itemType, nullptr,
+                       errorValues != nullptr ? &fromErrors : nullptr, projection,
+                       globalAttributes, reason);
+  }
+  return writeResult(fileName, description, itemType, &fromGrid,
+                     errorValues != nullptr ? &fromErrors : nullptr, projection,
+                     globalAttributes, reason);
+}
+
+int resultWriteLevels(const char* fileName, const FileDescription& description,
+                      std::int32_t itemType, const ResultLevelSource& levels,
+                      const char* projection, const TextAttributes* globalAttributes,
+                      const ResultLevelSource* errorLevels, std::string* reason) {
+  return writeResult(fileName, description, itemType, &levels, errorLevels, projection,
+                     globalAttributes, reason);
 }
 
 }  // namespace karnet

@@ -2,6 +2,7 @@
 #define KARNET_OUTPUT_RESULT_WRITE_H_
 
 #include <cstdint>
+#include <functional>
 #include <string>
 
 #include "output/result_attributes.h"
@@ -27,6 +28,19 @@ int resultWrite(const char* fileName, const FileDescription& description, int wr
                 std::int32_t itemType, const FloatGrid3D& values, const char* projection,
                 const TextAttributes* globalAttributes = nullptr,
                 const FloatGrid3D* errorValues = nullptr, std::string* reason = nullptr);
+
+// Hands over local level s (0 for the first level of the result) of the
+// result grid: nx * ny floats, x fastest, into buffer; false when it cannot.
+using ResultLevelSource = std::function<bool(std::int32_t s, float* buffer)>;
+
+// The same file, its values taken level by level from `levels`, first level
+// first, so that the whole grid never needs to be in one place.
+// errorLevels, when given, are the error field's levels, written as item 2.
+int resultWriteLevels(const char* fileName, const FileDescription& description,
+                      std::int32_t itemType, const ResultLevelSource& levels,
+                      const char* projection, const TextAttributes* globalAttributes = nullptr,
+                      const ResultLevelSource* errorLevels = nullptr,
+                      std::string* reason = nullptr);
 
 }  // namespace karnet
 

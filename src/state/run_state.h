@@ -1,9 +1,14 @@
 #ifndef KARNET_STATE_RUN_STATE_H_
 #define KARNET_STATE_RUN_STATE_H_
 
+#include <algorithm>
 #include <cstdint>
 #include <cstdio>
 
+#include <vector>
+
+#include "state/basic_bed.h"
+#include "state/level_partition.h"
 #include "support/file_description.h"
 #include "support/float_grid.h"
 
@@ -32,6 +37,34 @@ struct RunState {
   FileDescription* resultDescription = nullptr;
   std::FILE* observationFile = nullptr;
   double landValue = 0;
+
+  // The basic grid's levels and how they are shared out. basicBathymetry and
+  // basicValues hold the levels basicValues.l0 .. l0 + nl - 1 of this process:
+  // all basicLevels of them in a one-process run, one block of the local
+  // grid's levels per rank in a run over several (levelOwners, rank order).
+  // basicLevels 0 means the grids hold every level (state built by hand).
+  std::int32_t basicLevels = 0;
+  std::vector<LevelRange> levelOwners;
+  // Where the local grid lies in the basic grid (set by data scanning).
+  LocalWindow window;
+
+  // Levels of the whole basic grid, held here or not.
+  std::int32_t basicLevelCount() const { return basicLevels > 0 ? basicLevels : basicValues.nl; }
+  // The layers of a layer pass over the local grid's levels (pass step s is
+  // basic level lOff + s, s = 0 .. steps - 1) that this process holds: the
+  // steps first .. first + count - 1.
+  LevelRange heldSteps(std::int32_t lOff, std::int64_t steps) const {
+    const std::int64_t first = std::max<std::int64_t>(std::int64_t{basicValues.l0} - lOff, 0);
+    const std::int64_t end =
+        std::min<std::int64_t>(std::int64_t{basicValues.l0} + basicValues.nl - lOff, steps);
+    if (end <= first) return LevelRange{0, 0};
+    return LevelRange{static_cast<std::int32_t>(first), static_cast<std::int32_t>(end - first)};
+  }
+
+  // True when this process holds every level of the basic grid.
+  bool holdsAllLevels() const {
+    return basicValues.l0 == 0 && basicValues.nl == basicLevelCount();
+  }
 
   // Delete value of the result description (the float -1e-30 widened).
   double deleteValue() const;

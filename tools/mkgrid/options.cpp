@@ -6,6 +6,7 @@
 #include <cmath>
 #include <vector>
 
+#include "common/tool_argument.h"
 #include "mkgrid/esri_ascii.h"
 
 #ifndef KARNET_VERSION
@@ -86,25 +87,11 @@ ParseResult parseCommandLine(int argc, const char* const* argv, MkgridOptions* o
   bool originGiven = false;
   bool extentGiven = false;
   for (int i = 1; i < argc; ++i) {
-    std::string arg = argv[i];
-    std::string value;
-    bool hasValue = false;
-    if (arg.size() > 2 && arg.compare(0, 2, "--") == 0) {
-      const std::size_t eq = arg.find('=');
-      if (eq != std::string::npos) {
-        value = arg.substr(eq + 1);
-        arg = arg.substr(0, eq);
-        hasValue = true;
-      }
-    }
+    const ToolArgument argument = splitToolArgument(argv[i]);
+    const std::string& arg = argument.name;
+    const bool hasValue = argument.attached;
     auto needValue = [&](std::string* out) {
-      if (hasValue) {
-        *out = value;
-        return true;
-      }
-      if (i + 1 >= argc) return false;
-      *out = argv[++i];
-      return true;
+      return toolOptionValue(argument, argc, argv, i, out);
     };
     std::string text;
     auto takeValue = [&]() {

@@ -13,6 +13,7 @@
 #include <string>
 #include <vector>
 
+#include "common/tool_argument.h"
 #include "obs/argo_reader.h"
 #include "obs/converter.h"
 #include "obs/files.h"
@@ -27,6 +28,9 @@
 namespace {
 
 using namespace karnet::obs;
+using karnet::splitToolArgument;
+using karnet::ToolArgument;
+using karnet::toolOptionValue;
 
 constexpr const char* kUsage =
     "Usage: karnet-obs (--bathymetry FILE | --projection TEXT) [options] INPUT... [-o OUTPUT]\n";
@@ -122,25 +126,11 @@ int main(int argc, char** argv) {
   std::vector<std::string> inputs;
 
   for (int i = 1; i < argc; ++i) {
-    std::string arg = argv[i];
-    std::string value;
-    bool hasValue = false;
-    if (arg.size() > 2 && arg.compare(0, 2, "--") == 0) {
-      const std::size_t eq = arg.find('=');
-      if (eq != std::string::npos) {
-        value = arg.substr(eq + 1);
-        arg = arg.substr(0, eq);
-        hasValue = true;
-      }
-    }
+    const ToolArgument argument = splitToolArgument(argv[i]);
+    const std::string& arg = argument.name;
+    const bool hasValue = argument.attached;
     auto needValue = [&](std::string* out) {
-      if (hasValue) {
-        *out = value;
-        return true;
-      }
-      if (i + 1 >= argc) return false;
-      *out = argv[++i];
-      return true;
+      return toolOptionValue(argument, argc, argv, i, out);
     };
     std::string text;
     auto takeText = [&](std::string* out) {

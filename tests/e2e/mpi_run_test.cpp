@@ -1,0 +1,197 @@
+// One run over the ranks of an MPI job gives what the plain run gives: the
+// same exit code, messages, log and result bytes.
+#include <gtest/gtest.h>
+#include <signal.h>
+
+#include <filesystem>
+#include <map>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "e2e/e2e_support.h"
+
+namespace karnet::e2e {
+namespace {
+
+const std::map<std::string, std::string> kEnvironment = {
+    {"SOURCE_DATE_EPOCH", "1700000000"},
+    // Several ranks on one machine, also as root (as in a container).
+    {"OMPI_MCA_rmaps_base_oversubscribe", "1"},
+    {"OMPI_ALLOW_RUN_AS_ROOT", "1"},
+    {"OMPI_ALLOW_RUN_AS_ROOT_CONFIRM", "1"},
+};
+
+struct Outcome {
+  ProcessResult process;
+  std::string log;     // without the CPU time, which differs from run to run
+  std::string result;  // the result file's bytes, empty when there is none
+  std::string karnetLines;  // the lines karnet wrote to stderr
+};
+
+std::string withoutLines(const std::string& text, const std::string& marker,
+                         bool keepMatching) {
+  std::string kept;
+  for (const std::string& line : splitLines(text)) {
+    if ((line.find(marker) != std::string::npos) == keepMatching) kept += line + "\n";
+  }
+  return kept;
+}
+
+Outcome runCase(const ParameterFile& parameters, int ranks) {
+  TempDir dir;
+  writeSmallCase(dir, parameters);
+  Outcome o;
+  if (ranks == 0) {
+    o.process = runKarnet({"case.pfs"}, dir.path(), kEnvironment);
+  } else {
+    o.process = runProgram(KARNET_MPIEXEC, {"-np", std::to_string(ranks), KARNET_BINARY, "case.pfs"},
+                           dir.path(), kEnvironment);
+  }
+  o.log = withoutLines(readFile(dir.file("case.log")), "CPU time", false);
+  o.result = readFile(dir.file("result.nc"));
+  // mpirun adds notes of its own when a rank ends with an error.
+  for (const std::string& line : splitLines(o.process.err)) {
+    if (line.rfind("karnet", 0) == 0) o.karnetLines += line + "\n";
+  }
+  return o;
+}
+
+class MpiRun : public testing::Test {
+ protected:
+  void SetUp() override {
+    if (std::string(KARNET_MPIEXEC).empty() || !fileExists(KARNET_MPIEXEC)) {
+      GTEST_SKIP() << "no MPI launcher in this build";
+    }
+  }
+
+  // Runs plainly and over 2 and 3 ranks; the outcomes must agree.
+  void expectSameAsPlain(const ParameterFile& parameters, int exitCode) {
+    const Outcome plain = runCase(parameters, 0);
+    ASSERT_EQ(plain.process.exitCode, exitCode) << plain.process.err;
+    if (exitCode == 0) {
+      ASSERT_GT(plain.result.size(), 1000u);
+    } else {
+      EXPECT_TRUE(plain.result.empty());
+    }
+    for (int ranks : {2, 3}) {
+      SCOPED_TRACE(testing::Message() << ranks << " ranks");
+      const Outcome shared = runCase(parameters, ranks);
+      EXPECT_EQ(shared.process.exitCode, plain.process.exitCode) << shared.process.err;
+      EXPECT_EQ(shared.karnetLines, plain.karnetLines);
+      EXPECT_EQ(shared.log, plain.log);
+      EXPECT_TRUE(shared.result == plain.result) << "result files differ";
+    }
+  }
+};
+
+TEST_F(MpiRun, BilinearRunGivesThePlainRunsBytes) {
+  ParameterFile p;
+  p.projection = "'LOCAL'";
+  p.filterOperations = "2";
+  expectSameAsPlain(p, 0);
+}
+
+TEST_F(MpiRun, ObjectiveAnalysisFromALevelAboveTheFirst) {
+  ParameterFile p;
+  p.projection = "'LOCAL'";
+  p.analysis = "objective";
+  p.zRange = "3, 11";
+  p.filterType = "'shapiro'";
+  expectSameAsPlain(p, 0);
+}
+
+TEST_F(MpiRun, ResultThatCannotBeWrittenEndsEveryRankWithoutAFile) {
+  ParameterFile p;
+  p.projection = "'LOCAL'";
+  p.outputFileName = "|no such folder/result.nc|";
+  expectSameAsPlain(p, 1);
+}
+
+TEST_F(MpiRun, InvalidSettingsEndEveryRankWithTheSameMessage) {
+  ParameterFile p;
+  p.projection = "'LOCAL'";
+  p.spacing = "0";
+  expectSameAsPlain(p, 1);
+}
+
+TEST_F(MpiRun, CrossValidationIsRefusedOverSeveralRanks) {
+  TempDir dir;
+  ParameterFile p;
+  p.projection = "'LOCAL'";
+  p.analysis = "objective";
+  writeSmallCase(dir, p);
+  const ProcessResult run = runProgram(
+      KARNET_MPIEXEC, {"-np", "2", KARNET_BINARY, "--cross-validate", "case.pfs"}, dir.path(),
+      kEnvironment);
+  EXPECT_EQ(run.exitCode, 1);
+  EXPECT_NE(run.err.find("karnet: ERROR: cross-validation runs in one process"), std::string::npos)
+      << run.err;
+  EXPECT_NE(readFile(dir.file("case.log")).find("cross-validation runs in one process"),
+            std::string::npos);
+}
+
+// The process of rank 0 of the job working in dir, or 0.
+int rankZeroIn(const std::string& dir) {
+  std::error_code ignored;
+  for (const auto& entry : std::filesystem::directory_iterator("/proc", ignored)) {
+    const std::string name = entry.path().filename().string();
+    if (name.find_first_not_of("0123456789") != std::string::npos) continue;
+    if (std::filesystem::read_symlink(entry.path() / "cwd", ignored) != dir) continue;
+    const std::string environment = readFile(entry.path().string() + "/environ");
+    if (environment.find(std::string("OMPI_COMM_WORLD_RANK=0") + '\0') != std::string::npos ||
+        environment.rfind("OMPI_COMM_WORLD_RANK=0", 0) == 0) {
+      return std::stoi(name);
+    }
+  }
+  return 0;
+}
+
+TEST_F(MpiRun, CancelOnRankZeroEndsEveryRank) {
+  // A basin large enough to be cancelled while its levels are analysed.
+  TempDir dir;
+  BathymetrySpec b;
+  b.nx = b.ny = 300;
+  b.spacing = 100.0;
+  b.projection = "LOCAL";
+  b.originLongitude = b.originLatitude = 0.0;
+  b.heights.assign(static_cast<std::size_t>(b.nx) * b.ny, -61.0f);
+  writeBathymetry(dir.file("bathymetry.nc"), b);
+  std::ostringstream obs;
+  for (int j = 5; j < b.ny; j += 10) {
+    for (int i = 5; i < b.nx; i += 10) {
+      for (double z = -0.5; z > -60.0; z -= 1.5) obs << i * 100 << ' ' << j * 100 << ' ' << z << ' ' << 8.0 + 0.1 * z << '\n';
+    }
+  }
+  writeFile(dir.file("observations.txt"), obs.str());
+  ParameterFile p;
+  p.projection = "'LOCAL'";
+  p.analysis = "objective";
+  p.zRange = "0, 39";
+  p.spacing = "1.5";
+  p.correlationSampleSize = "30";
+  writeFile(dir.file("case.pfs"), p.render());
+
+  bool signalled = false;
+  const ProcessResult run = runProgram(
+      KARNET_MPIEXEC, {"-np", "2", KARNET_BINARY, "//apv", "case.pfs"}, dir.path(), kEnvironment,
+      [&](int) {
+        // Once the levels are being analysed, rank 0 alone is asked to cancel.
+        if (readFile(dir.file("case.log")).find("Basic grid parameters") == std::string::npos) {
+          return false;
+        }
+        const int rankZero = rankZeroIn(dir.path());
+        if (rankZero != 0) signalled = kill(rankZero, SIGUSR1) == 0;
+        return signalled;
+      });
+  ASSERT_TRUE(signalled);
+  // Every rank ended as rank 0 did and left the job: mpirun reports 0 only then.
+  EXPECT_EQ(run.exitCode, 0) << run.err;
+  EXPECT_FALSE(fileExists(dir.file("result.nc")));
+  const std::string log = readFile(dir.file("case.log"));
+  EXPECT_EQ(log.find("Statistics for local grid"), std::string::npos);
+  EXPECT_NE(log.find("Completion code : Successful"), std::string::npos);
+}
+
+}  // namespace
+}  // namespace karnet::e2e
