@@ -2,7 +2,7 @@
 # Builds the libFuzzer harnesses of tests/fuzz with clang, AddressSanitizer and
 # UndefinedBehaviorSanitizer (in build-fuzz/) and runs each one.
 #   scripts/fuzz.sh [SECONDS] [HARNESS...]   SECONDS per harness (default $FUZZ_SECONDS, else
-#                                             20: the seven harnesses take about 2.5 minutes);
+#                                             30: the seven harnesses take about 3.5 minutes);
 #                                             all harnesses unless some are named
 #   FUZZ_RUNS=N scripts/fuzz.sh              stops each harness after N inputs instead
 # New inputs go to build-fuzz/corpus/<harness>/ (the seeds in tests/fuzz/corpus/ stay as
@@ -10,7 +10,7 @@
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
-seconds=${1:-${FUZZ_SECONDS:-20}}
+seconds=${1:-${FUZZ_SECONDS:-30}}
 shift || true
 harnesses=("$@")
 [ ${#harnesses[@]} -gt 0 ] || harnesses=(parameter_file observation_lines bathymetry esri_ascii source_raster obs_table argo)

@@ -2,7 +2,7 @@
 # Installs what is missing, builds karnet with its tests and runs every test; then builds the
 # tests again with AddressSanitizer and UndefinedBehaviorSanitizer (in build-sanitize/) and
 # runs them there too. Exit status 0 only when both pass.
-# Last, each libFuzzer harness runs for 20 seconds (scripts/fuzz.sh, in build-fuzz/;
+# Last, each libFuzzer harness runs for 30 seconds (scripts/fuzz.sh, in build-fuzz/;
 # FUZZ_SECONDS=N for another time).
 #   KARNET_NO_SANITIZE=1 scripts/test.sh   skips the sanitizer build.
 #   KARNET_TSAN=1 scripts/test.sh          also runs the threaded tests under ThreadSanitizer.
@@ -26,7 +26,7 @@ if [ "${KARNET_NO_SANITIZE:-0}" != "1" ]; then
      UBSAN_OPTIONS=print_stacktrace=1:halt_on_error=1 ctest --output-on-failure -j "$jobs")
 fi
 if [ "${KARNET_NO_FUZZ:-0}" != "1" ]; then
-  ./scripts/fuzz.sh "${FUZZ_SECONDS:-20}"
+  ./scripts/fuzz.sh "${FUZZ_SECONDS:-30}"
 fi
 if [ "${KARNET_TSAN:-0}" = "1" ]; then
   # Only the threaded kernel tests, so that this stays short.

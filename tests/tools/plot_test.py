@@ -103,8 +103,8 @@ def load_plot_module():
     import importlib.util
 
     loader = importlib.machinery.SourceFileLoader("karnet_plot", PLOT)
-    spec = importlib.util.spec_from_loader("karnet_plot", loader)
-    module = importlib.util.module_from_spec(spec)
+    module_spec = importlib.util.spec_from_loader("karnet_plot", loader)
+    module = importlib.util.module_from_spec(module_spec)
     loader.exec_module(module)
     return module
 
