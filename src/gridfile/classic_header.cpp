@@ -165,8 +165,10 @@ ClassicHeader checkClassicHeader(std::FILE* stream, std::uint64_t fileSize) {
     }
     // The values of a gridded item (two or more dimensions) must lie in the
     // file: a cut file would otherwise read as zeros. For a record variable
-    // numrecs times one record's values is a lower bound of where it ends.
-    if (rank < 2 || (isRecord && streaming)) continue;
+    // numrecs times one record's values is a lower bound of where it ends; with
+    // no records it holds nothing, and its offset (inside the first record,
+    // which is not there) may lie past the end of the file.
+    if (rank < 2 || (isRecord && (streaming || records == 0))) continue;
     std::uint64_t bytes = typeSize(type, version);
     for (std::uint64_t length : shape) {
       if (length != 0 && bytes > fileSize / length) return ClassicHeader::kBroken;

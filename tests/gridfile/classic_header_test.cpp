@@ -36,12 +36,15 @@ class ClassicHeaderTest : public test::ScratchTest {
   }
 };
 
-// Every attribute type of the format, names of several lengths, an unlimited dimension.
+// Every attribute type of the format, names of several lengths, an unlimited dimension
+// without records (the second record variable's offset then lies past the end of the file,
+// as in Argo profile files with an empty history).
 const char kCdl[] =
     "netcdf c {\n"
     "dimensions:\n  t = UNLIMITED ;\n  y = 3 ;\n  longer_name_x = 5 ;\n"
     "variables:\n"
     "  float v(t, y, longer_name_x) ;\n"
+    "  char history(t, y, longer_name_x) ;\n"
     "    v:b = 1b, 2b, 3b ; v:s = 7s ; v:i = 1, 2 ; v:f = 1.5f ; v:d = 2.5, 3.5, 4.5 ;\n"
     "    v:text = \"abcde\" ;\n"
     "  double c ;\n"
