@@ -271,5 +271,17 @@ TEST(ObsProgram, KarnetRunsOnTheOutput) {
   EXPECT_GT(estimates, shape[0] * shape[1] * shape[2] / 2);
 }
 
+// The Argo multi-profile file of the Angola Basin example, as downloaded (a classic-format
+// file whose history dimension has no records): every good measurement inside the box.
+TEST(ObsProgram, ReadsTheExamplesArgoFileAsDownloaded) {
+  const TempDir dir;
+  const std::string argo = std::string(KARNET_SOURCE_DIR) + "/examples/angola_basin/3902131_prof.nc";
+  const ProcessResult r =
+      runObs({"-p", "UTM-31S", "--box", "-0.1,-9.6,5.0,-5.8", argo, "-o", "obs.txt"}, dir);
+  ASSERT_EQ(r.exitCode, 0) << r.err;
+  EXPECT_NE(r.err.find("kept 27401 of 56450 rows"), std::string::npos) << r.err;
+  EXPECT_EQ(splitLines(readFile(dir.file("obs.txt"))).size(), 27401u);
+}
+
 }  // namespace
 }  // namespace karnet::e2e
