@@ -6,7 +6,7 @@ set -euo pipefail
 packages=(
   build-essential cmake
   libgtest-dev libgmock-dev
-  libnetcdf-dev netcdf-bin
+  libnetcdf-dev netcdf-bin libhdf5-dev libdeflate-dev
   libproj-dev proj-data
   python3 python3-numpy python3-netcdf4 python3-xarray
   libgdal-dev gdal-bin python3-gdal cdo

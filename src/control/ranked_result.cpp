@@ -51,7 +51,8 @@ int writeRankedResult(const RunInvocation& invocation, RunState& state,
   const int written =
       resultWriteLevels(parameters.outputData.FileName, description,
                         parameters.outputData.ItemType, levels, settings.projection, &attributes,
-                        errorField != nullptr ? &errors : nullptr, writeProblem);
+                        errorField != nullptr ? &errors : nullptr, writeProblem,
+                        invocation.threads);
   // A writer that stopped early leaves levels on their way.
   gather.drain();
   if (summary != nullptr) *summary = counted;

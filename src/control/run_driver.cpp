@@ -135,7 +135,8 @@ int runPhases(Run& run, RunSummary* summary, std::string* writeProblem) {
   const int written =
       resultWrite(parameters.outputData.FileName, *state.resultDescription, 1,
                   parameters.outputData.ItemType, state.localValues, settings.projection,
-                  &attributes, errorField.data != nullptr ? &errorField : nullptr, writeProblem);
+                  &attributes, errorField.data != nullptr ? &errorField : nullptr, writeProblem,
+                  run.invocation.threads);
   if (errorField.data != nullptr) grid3DFree(errorField);
   return written;
 }

@@ -50,6 +50,9 @@ void grdHeaderDestroy(GrdHeader** header);
 // ---- writing ----
 int grdHeaderCreate(int itemCount, const char* fileName, const char* title, int a, int b, int c,
                     GrdHeader** header);
+// Threads that compress the values of the file being written (default 1); the
+// file's bytes do not depend on it.
+int grdSetCompressionThreads(GrdHeader* header, int threads);
 int grdSetDeleteValFloat(GrdHeader* header, float value);
 int grdSetDeleteValDouble(GrdHeader* header, double value);
 int grdSetDataType(GrdHeader* header, int dataType);
@@ -110,6 +113,10 @@ int grdWriteItemNTimeStep(GrdHeader* header, GrdFile* file, int itemNumber, doub
 // order, and grdFinishItemTimeStep then sets the step's time and closes it.
 int grdWriteItemLevel(GrdHeader* header, GrdFile* file, std::int32_t level, const float* data,
                       int itemNumber = 1);
+// The same for levelCount consecutive levels from firstLevel (levelCount * nx * ny
+// floats), their chunks compressed at once.
+int grdWriteItemLevels(GrdHeader* header, GrdFile* file, std::int32_t firstLevel,
+                       std::int32_t levelCount, const float* data, int itemNumber = 1);
 int grdFinishItemTimeStep(GrdHeader* header, GrdFile* file, double time, int itemNumber = 1);
 // Closes the file; a complete file is renamed to its final name. Sets *file to null.
 // reason, when given, says why the file could not be put in place.

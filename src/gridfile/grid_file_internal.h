@@ -15,6 +15,7 @@
 #include <utility>
 #include <vector>
 
+#include "gridfile/chunk_writer.h"
 #include "gridfile/grid_file.h"
 
 namespace karnet {
@@ -88,6 +89,11 @@ struct GrdFile {
   bool hasTime = false;
   std::size_t stepsWritten = 0;
   bool failed = false;
+  // The item variables' names, item 1 first.
+  std::vector<std::string> itemNames;
+  // Set from the first value written on: the file's image, laid out and
+  // closed by NetCDF, taking the values chunk by chunk (ncid is then -1).
+  std::unique_ptr<ChunkWriter> chunks;
 };
 
 struct GrdHeader {
@@ -117,6 +123,7 @@ struct GrdHeader {
   double orientation = 0.0;
   bool georeferenced = false;
   GrdGeoreference georeference;
+  int compressionThreads = 1;
 };
 
 // Chains the blocks of a header in order (after a block was added).

@@ -92,7 +92,7 @@ namespace {
 int writeResult(const char* fileName, const FileDescription& description,
                 std::int32_t itemType, const ResultLevelSource* levels,
                 const ResultLevelSource* errorLevels, const char* projection,
-                const TextAttributes* globalAttributes, std::string* reason) {
+                const TextAttributes* globalAttributes, std::string* reason, int threads) {
   std::string ignored;
   if (reason == nullptr) reason = &ignored;
   grdInitSystem();
@@ -109,7 +109,8 @@ int writeResult(const char* fileName, const FileDescription& description,
     *reason = "its layout cannot be described (axes, projection or attributes)";
     return 0;
   }
-  if (grdFileCreate(fileName, header, &file) != 0) {
+  if (grdSetCompressionThreads(header, std::max(threads, 1)) != 0 ||
+      grdFileCreate(fileName, header, &file) != 0) {
     grdHeaderDestroy(&header);
     *reason = grdCreateProblem(fileName != nullptr ? fileName : "");
     if (reason->empty()) *reason = "cannot be created";
@@ -119,13 +120,19 @@ int writeResult(const char* fileName, const FileDescription& description,
     const std::int64_t nx = description.axes[1].lastIndex + 1;
     const std::int64_t ny = description.axes[2].lastIndex + 1;
     const std::int32_t nz = description.axes[3].lastIndex + 1;
-    std::vector<float> buffer(static_cast<std::size_t>(nx * ny));
+    // Levels go to the file in batches of one per thread, whose chunks are
+    // compressed at once.
+    const std::int32_t batch = std::clamp<std::int32_t>(threads, 1, std::max(nz, 1));
+    std::vector<float> buffer(static_cast<std::size_t>(nx * ny * batch));
     bool written = true;
     for (int item = 1; item <= (errorLevels != nullptr ? 2 : 1) && written; ++item) {
       const ResultLevelSource& source = item == 1 ? *levels : *errorLevels;
-      for (std::int32_t s = 0; s < nz && written; ++s) {
-        written = source(s, buffer.data()) &&
-                  grdWriteItemLevel(header, file, s, buffer.data(), item) == 0;
+      for (std::int32_t s = 0; s < nz && written; s += batch) {
+        const std::int32_t count = std::min(batch, nz - s);
+        for (std::int32_t b = 0; b < count && written; ++b) {
+          written = source(s + b, buffer.data() + b * nx * ny);
+        }
+        written = written && grdWriteItemLevels(header, file, s, count, buffer.data(), item) == 0;
       }
       written = written && grdFinishItemTimeStep(header, file, 0.0, item) == 0;
     }
@@ -156,7 +163,7 @@ ResultLevelSource levelsOf(const FloatGrid3D& values, std::int64_t described) {
 int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
                 std::int32_t itemType, const FloatGrid3D& values, const char* projection,
                 const TextAttributes* globalAttributes, const FloatGrid3D* errorValues,
-                std::string* reason) {
+                std::string* reason, int threads) {
   const std::int64_t described = std::int64_t{description.axes[1].lastIndex + 1} *
                                  (description.axes[2].lastIndex + 1);
   // The values go level by level, as in a run over several processes, so that
@@ -168,19 +175,20 @@ int resultWrite(const char* fileName, const FileDescription& description, int wr
     // Without values the error item is still described.
     return writeResult(fileName, description, itemType, nullptr,
                        errorValues != nullptr ? &fromErrors : nullptr, projection,
-                       globalAttributes, reason);
+                       globalAttributes, reason, threads);
   }
   return writeResult(fileName, description, itemType, &fromGrid,
                      errorValues != nullptr ? &fromErrors : nullptr, projection,
-                     globalAttributes, reason);
+                     globalAttributes, reason, threads);
 }
 
 int resultWriteLevels(const char* fileName, const FileDescription& description,
                       std::int32_t itemType, const ResultLevelSource& levels,
                       const char* projection, const TextAttributes* globalAttributes,
-                      const ResultLevelSource* errorLevels, std::string* reason) {
+                      const ResultLevelSource* errorLevels, std::string* reason,
+                      int threads) {
   return writeResult(fileName, description, itemType, &levels, errorLevels, projection,
-                     globalAttributes, reason);
+                     globalAttributes, reason, threads);
 }
 
 }  // namespace karnet

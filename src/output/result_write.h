@@ -21,13 +21,15 @@ struct FloatGrid3D;
 // grid mapping. globalAttributes (title, history, ...) are added when given.
 // With errorValues (the objective analysis' error field, same shape as values)
 // the file gets a second item "<item>_error" that item 1 names as its
-// ancillary variable. 1 when the file was written and closed, 0 on any
+// ancillary variable. threads compress the values (the bytes do not depend on
+// their number). 1 when the file was written and closed, 0 on any
 // failure; a failed write leaves no file under fileName and keeps an earlier
 // file of that name; reason, when given, then says why.
 int resultWrite(const char* fileName, const FileDescription& description, int writeValues,
                 std::int32_t itemType, const FloatGrid3D& values, const char* projection,
                 const TextAttributes* globalAttributes = nullptr,
-                const FloatGrid3D* errorValues = nullptr, std::string* reason = nullptr);
+                const FloatGrid3D* errorValues = nullptr, std::string* reason = nullptr,
+                int threads = 1);
 
 // Hands over local level s (0 for the first level of the result) of the
 // result grid: nx * ny floats, x fastest, into buffer; false when it cannot.
@@ -40,7 +42,7 @@ int resultWriteLevels(const char* fileName, const FileDescription& description,
                       std::int32_t itemType, const ResultLevelSource& levels,
                       const char* projection, const TextAttributes* globalAttributes = nullptr,
                       const ResultLevelSource* errorLevels = nullptr,
-                      std::string* reason = nullptr);
+                      std::string* reason = nullptr, int threads = 1);
 
 }  // namespace karnet
 

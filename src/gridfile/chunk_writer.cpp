@@ -1,0 +1,300 @@
+#include "gridfile/chunk_writer.h"
+
+#include <hdf5.h>
+#include <libdeflate.h>
+
+#include <algorithm>
+#include <atomic>
+#include <bit>
+#include <cstring>
+#include <new>
+#include <string>
+#include <utility>
+
+namespace karnet {
+namespace {
+
+constexpr int kMaxRank = 4;
+// The core driver's growth step of the image.
+constexpr std::size_t kImageIncrement = std::size_t{4} << 20;
+
+// A name for an in-memory image that no file can have: the core driver
+// refuses to open an image under the name of an existing file, and tells
+// open images apart by name.
+std::string imageName() {
+  static std::atomic<unsigned long> counter{0};
+  return "/dev/null/karnet-image-" + std::to_string(counter.fetch_add(1));
+}
+
+struct Handle {
+  hid_t id = H5I_INVALID_HID;
+  herr_t (*close)(hid_t) = nullptr;
+  Handle() = default;
+  Handle(hid_t i, herr_t (*c)(hid_t)) : id(i), close(c) {}
+  Handle(Handle&& other) noexcept : id(std::exchange(other.id, H5I_INVALID_HID)), close(other.close) {}
+  Handle& operator=(Handle&& other) noexcept {
+    if (this != &other) {
+      release();
+      id = std::exchange(other.id, H5I_INVALID_HID);
+      close = other.close;
+    }
+    return *this;
+  }
+  ~Handle() { release(); }
+  void release() {
+    if (id >= 0 && close != nullptr) close(id);
+    id = H5I_INVALID_HID;
+  }
+  bool ok() const { return id >= 0; }
+};
+
+}  // namespace
+
+bool compressShuffledChunk(const float* values, std::size_t count,
+                           std::vector<unsigned char>& out) {
+  try {
+    const std::size_t bytes = count * sizeof(float);
+    std::vector<unsigned char> shuffled(bytes);
+    const auto* in = reinterpret_cast<const unsigned char*>(values);
+    for (std::size_t b = 0; b < sizeof(float); ++b) {
+      unsigned char* to = shuffled.data() + b * count;
+      for (std::size_t i = 0; i < count; ++i) to[i] = in[i * sizeof(float) + b];
+    }
+    libdeflate_compressor* compressor = libdeflate_alloc_compressor(kGrdDeflateLevel);
+    if (compressor == nullptr) return false;
+    out.resize(libdeflate_zlib_compress_bound(compressor, bytes));
+    const std::size_t size =
+        libdeflate_zlib_compress(compressor, shuffled.data(), bytes, out.data(), out.size());
+    libdeflate_free_compressor(compressor);
+    out.resize(size);
+    return size > 0;
+  } catch (const std::bad_alloc&) {
+    return false;
+  }
+}
+
+namespace {
+
+struct ItemDataset {
+  Handle dataset;
+  int rank = 0;
+  bool hasTime = false;
+  bool hasZ = false;
+  hsize_t dims[kMaxRank] = {};
+  hsize_t chunk[kMaxRank] = {};
+};
+
+// Whether the dataset's chunks can be written here: 32-bit little-endian
+// floats, chunks one level thick, the filters shuffle then deflate.
+bool directlyWritable(hid_t dataset, const ItemDataset& item) {
+  if (std::endian::native != std::endian::little) return false;
+  const Handle type(H5Dget_type(dataset), H5Tclose);
+  if (!type.ok() || H5Tequal(type.id, H5T_IEEE_F32LE) <= 0) return false;
+  const Handle plist(H5Dget_create_plist(dataset), H5Pclose);
+  if (!plist.ok() || H5Pget_layout(plist.id) != H5D_CHUNKED) return false;
+  for (int d = 0; d + 2 < item.rank; ++d) {
+    if (item.chunk[d] != 1) return false;
+  }
+  if (H5Pget_nfilters(plist.id) != 2) return false;
+  const H5Z_filter_t expected[2] = {H5Z_FILTER_SHUFFLE, H5Z_FILTER_DEFLATE};
+  for (unsigned f = 0; f < 2; ++f) {
+    unsigned flags = 0;
+    std::size_t elements = 8;
+    unsigned values[8] = {};
+    unsigned config = 0;
+    if (H5Pget_filter2(plist.id, f, &flags, &elements, values, 0, nullptr, &config) !=
+        expected[f]) {
+      return false;
+    }
+  }
+  return true;
+}
+
+bool examine(hid_t dataset, bool withTime, ItemDataset& item) {
+  const Handle space(H5Dget_space(dataset), H5Sclose);
+  if (!space.ok()) return false;
+  const int rank = H5Sget_simple_extent_ndims(space.id);
+  const int spatial = rank - (withTime ? 1 : 0);
+  if (rank < 2 || rank > kMaxRank || spatial < 2 || spatial > 3) return false;
+  item.rank = rank;
+  item.hasTime = withTime;
+  item.hasZ = spatial == 3;
+  if (H5Sget_simple_extent_dims(space.id, item.dims, nullptr) != rank) return false;
+  const Handle plist(H5Dget_create_plist(dataset), H5Pclose);
+  if (!plist.ok()) return false;
+  if (H5Pget_layout(plist.id) == H5D_CHUNKED) {
+    if (H5Pget_chunk(plist.id, rank, item.chunk) != rank) return false;
+  }
+  return directlyWritable(dataset, item);
+}
+
+// Makes the dataset's time extent reach step.
+bool reachStep(hid_t dataset, hsize_t* dims, bool hasTime, std::size_t step) {
+  if (!hasTime) return step == 0;
+  if (dims[0] > step) return true;
+  dims[0] = step + 1;
+  return H5Dset_extent(dataset, dims) >= 0;
+}
+
+}  // namespace
+
+struct ChunkWriter::Impl {
+  Handle file;
+  std::vector<ItemDataset> items;
+  Handle time;
+  hsize_t timeDims[1] = {0};
+  float fill = 0.0f;
+  int threads = 1;
+
+  bool writeDirect(ItemDataset& item, std::size_t step, std::int64_t first, std::int64_t count,
+                   const float* data);
+};
+
+ChunkWriter::ChunkWriter(std::unique_ptr<Impl> impl) : impl_(std::move(impl)) {}
+ChunkWriter::~ChunkWriter() {
+  if (impl_ == nullptr) return;
+  // Datasets before the file.
+  impl_->items.clear();
+  impl_->time = Handle();
+}
+
+std::unique_ptr<ChunkWriter> ChunkWriter::open(const void* image, std::size_t size,
+                                               const std::vector<std::string>& items,
+                                               const std::string& timeName, float fillValue) {
+  if (image == nullptr || size == 0 || items.empty()) return nullptr;
+  // Failures come back as return values; HDF5 is not to print them.
+  H5Eset_auto2(H5E_DEFAULT, nullptr, nullptr);
+  auto impl = std::make_unique<Impl>();
+  impl->fill = fillValue;
+  {
+    const Handle access(H5Pcreate(H5P_FILE_ACCESS), H5Pclose);
+    if (!access.ok() || H5Pset_fapl_core(access.id, kImageIncrement, 0) < 0 ||
+        H5Pset_file_image(access.id, const_cast<void*>(image), size) < 0) {
+      return nullptr;
+    }
+    impl->file = Handle(H5Fopen(imageName().c_str(), H5F_ACC_RDWR, access.id), H5Fclose);
+  }
+  if (!impl->file.ok()) return nullptr;
+  const bool withTime = !timeName.empty();
+  if (withTime) {
+    impl->time = Handle(H5Dopen2(impl->file.id, timeName.c_str(), H5P_DEFAULT), H5Dclose);
+    if (!impl->time.ok()) return nullptr;
+    const Handle space(H5Dget_space(impl->time.id), H5Sclose);
+    if (!space.ok() || H5Sget_simple_extent_ndims(space.id) != 1 ||
+        H5Sget_simple_extent_dims(space.id, impl->timeDims, nullptr) != 1) {
+      return nullptr;
+    }
+  }
+  impl->items.resize(items.size());
+  for (std::size_t i = 0; i < items.size(); ++i) {
+    ItemDataset& item = impl->items[i];
+    item.dataset = Handle(H5Dopen2(impl->file.id, items[i].c_str(), H5P_DEFAULT), H5Dclose);
+    if (!item.dataset.ok() || !examine(item.dataset.id, withTime, item)) return nullptr;
+  }
+  return std::unique_ptr<ChunkWriter>(new ChunkWriter(std::move(impl)));
+}
+
+void ChunkWriter::setThreads(int threads) { impl_->threads = std::max(threads, 1); }
+
+bool ChunkWriter::writeLevels(std::size_t item, std::size_t step, std::int64_t firstLevel,
+                              std::int64_t levelCount, const float* data) {
+  if (item >= impl_->items.size() || data == nullptr || levelCount < 1 || firstLevel < 0) {
+    return false;
+  }
+  ItemDataset& target = impl_->items[item];
+  const std::int64_t levels =
+      target.hasZ ? static_cast<std::int64_t>(target.dims[target.hasTime ? 1 : 0]) : 1;
+  if (firstLevel + levelCount > levels) return false;
+  if (!reachStep(target.dataset.id, target.dims, target.hasTime, step)) return false;
+  return impl_->writeDirect(target, step, firstLevel, levelCount, data);
+}
+
+bool ChunkWriter::Impl::writeDirect(ItemDataset& item, std::size_t step, std::int64_t first,
+                                    std::int64_t count, const float* data) {
+  const std::int64_t nx = static_cast<std::int64_t>(item.dims[item.rank - 1]);
+  const std::int64_t ny = static_cast<std::int64_t>(item.dims[item.rank - 2]);
+  const std::int64_t cx = static_cast<std::int64_t>(item.chunk[item.rank - 1]);
+  const std::int64_t cy = static_cast<std::int64_t>(item.chunk[item.rank - 2]);
+  if (cx < 1 || cy < 1) return false;
+  const std::int64_t across = (nx + cx - 1) / cx;
+  const std::int64_t down = (ny + cy - 1) / cy;
+  const std::int64_t perLevel = across * down;
+  const std::int64_t tasks = perLevel * count;
+  std::vector<std::vector<unsigned char>> compressed(static_cast<std::size_t>(tasks));
+  std::atomic<bool> failed{false};
+  const float fillValue = fill;
+  // Each chunk is compressed on its own, so the bytes do not depend on the
+  // number of threads; they are stored afterwards in order.
+#pragma omp parallel for schedule(dynamic, 1) num_threads(threads) if (threads > 1 && tasks > 1)
+  for (std::int64_t t = 0; t < tasks; ++t) {
+    if (failed.load(std::memory_order_relaxed)) continue;
+    try {
+      const std::int64_t level = t / perLevel;
+      const std::int64_t row0 = (t % perLevel) / across * cy;
+      const std::int64_t col0 = (t % perLevel) % across * cx;
+      const std::int64_t rows = std::min(cy, ny - row0);
+      const std::int64_t cols = std::min(cx, nx - col0);
+      const float* levelData = data + level * nx * ny;
+      std::vector<float> chunk;
+      const float* values = levelData + row0 * nx + col0;
+      if (rows != cy || cols != cx || cx != nx) {
+        // Edge chunks are stored whole; the part outside the grid holds the fill value.
+        chunk.assign(static_cast<std::size_t>(cx * cy), fillValue);
+        for (std::int64_t r = 0; r < rows; ++r) {
+          std::copy(levelData + (row0 + r) * nx + col0, levelData + (row0 + r) * nx + col0 + cols,
+                    chunk.begin() + r * cx);
+        }
+        values = chunk.data();
+      }
+      if (!compressShuffledChunk(values, static_cast<std::size_t>(cx * cy),
+                                 compressed[static_cast<std::size_t>(t)])) {
+        failed = true;
+      }
+    } catch (const std::bad_alloc&) {
+      failed = true;
+    }
+  }
+  if (failed) return false;
+  for (std::int64_t t = 0; t < tasks; ++t) {
+    hsize_t offset[kMaxRank] = {};
+    int d = 0;
+    if (item.hasTime) offset[d++] = step;
+    if (item.hasZ) offset[d++] = static_cast<hsize_t>(first + t / perLevel);
+    offset[d++] = static_cast<hsize_t>((t % perLevel) / across * cy);
+    offset[d] = static_cast<hsize_t>((t % perLevel) % across * cx);
+    std::vector<unsigned char>& bytes = compressed[static_cast<std::size_t>(t)];
+    if (H5Dwrite_chunk(item.dataset.id, H5P_DEFAULT, 0, offset, bytes.size(), bytes.data()) < 0) {
+      return false;
+    }
+    std::vector<unsigned char>().swap(bytes);
+  }
+  return true;
+}
+
+bool ChunkWriter::writeTime(std::size_t step, double time) {
+  if (!impl_->time.ok() || !reachStep(impl_->time.id, impl_->timeDims, true, step)) return false;
+  const hsize_t start[1] = {step};
+  const hsize_t one[1] = {1};
+  const Handle fileSpace(H5Dget_space(impl_->time.id), H5Sclose);
+  const Handle memorySpace(H5Screate_simple(1, one, nullptr), H5Sclose);
+  if (!fileSpace.ok() || !memorySpace.ok() ||
+      H5Sselect_hyperslab(fileSpace.id, H5S_SELECT_SET, start, nullptr, one, nullptr) < 0) {
+    return false;
+  }
+  return H5Dwrite(impl_->time.id, H5T_NATIVE_DOUBLE, memorySpace.id, fileSpace.id, H5P_DEFAULT,
+                  &time) >= 0;
+}
+
+bool ChunkWriter::image(std::vector<unsigned char>& bytes) {
+  if (H5Fflush(impl_->file.id, H5F_SCOPE_LOCAL) < 0) return false;
+  const ssize_t size = H5Fget_file_image(impl_->file.id, nullptr, 0);
+  if (size <= 0) return false;
+  try {
+    bytes.resize(static_cast<std::size_t>(size));
+  } catch (const std::bad_alloc&) {
+    return false;
+  }
+  return H5Fget_file_image(impl_->file.id, bytes.data(), bytes.size()) == size;
+}
+
+}  // namespace karnet
