@@ -42,19 +42,15 @@ struct InterpolationCounts {
 
 // Working storage of the thread that analyses a layer: the layer's values and
 // bed, the copy of the values as they were before the layer's pass (the only
-// data the estimators see) and the count table of that copy.
+// data the estimators see) and the search tables of that copy.
 class LayerWorkspace {
  public:
   LayerWorkspace(std::int32_t nj, std::int32_t nk)
       : size_(static_cast<std::size_t>(nj) * static_cast<std::size_t>(nk)),
-        values_(size_), bed_(size_), scratch_(size_),
-        counts_((static_cast<std::size_t>(nj) + 1) * (static_cast<std::size_t>(nk) + 1)) {
+        values_(size_), bed_(size_), scratch_(size_), tables(nj, nk) {
     values = FloatGrid2D{0, 0, nj, nk, values_.data()};
     bed = FloatGrid2D{0, 0, nj, nk, bed_.data()};
     scratch = FloatGrid2D{0, 0, nj, nk, scratch_.data()};
-    index.nj = nj;
-    index.nk = nk;
-    index.counts = counts_.data();
   }
   LayerWorkspace(const LayerWorkspace&) = delete;
   LayerWorkspace& operator=(const LayerWorkspace&) = delete;
@@ -62,26 +58,26 @@ class LayerWorkspace {
   FloatGrid2D values;
   FloatGrid2D bed;
   FloatGrid2D scratch;
-  SearchIndex index;
 
  private:
   std::size_t size_;
   std::vector<float> values_;
   std::vector<float> bed_;
   std::vector<float> scratch_;
-  std::vector<std::uint32_t> counts_;
+
+ public:
+  SearchTables tables;
 };
 
 // Estimate for the empty wet node (j, k) from the data of the scratch layer.
-// hints belong to the calling thread.
-float estimateNode(std::int32_t j, std::int32_t k, const LayerWorkspace& ws, SearchHints& hints,
-                   float reach, double deleteValue, InterpolationCounts& counts) {
+float estimateNode(std::int32_t j, std::int32_t k, const LayerWorkspace& ws, float reach,
+                   double deleteValue, InterpolationCounts& counts) {
   std::int32_t jHit[kHitListSize];
   std::int32_t kHit[kHitListSize];
   float f[kHitListSize];
   float w[kHitListSize];
   const FloatGrid2D& data = ws.scratch;
-  const std::int32_t n = search(j, k, data, reach, deleteValue, ws.index, hints, jHit, kHit);
+  const std::int32_t n = ws.tables.search(j, k, reach, jHit, kHit);
   if (n == 4) {
     for (int i = 1; i <= 4; ++i) f[i] = data.data[std::int64_t{kHit[i]} * data.nj + jHit[i]];
     ++counts.bilinear;
@@ -140,17 +136,15 @@ InterpolationCounts interpolateLayer(const LayerPass& pass, std::int32_t level,
   grid3DLayerGet(*pass.bathymetry, level, ws.bed);
   grid3DLayerGet(*pass.values, level, ws.values);
   std::memcpy(ws.scratch.data, ws.values.data, static_cast<std::size_t>(layerSize) * sizeof(float));
-  searchIndexBuild(ws.index, ws.scratch, deleteValue);
+  ws.tables.build(ws.scratch, deleteValue, pass.rowThreads);
 
   // Every estimate reads only the scratch copy and writes only its own node,
-  // so the rows of the footprint may go to different threads. Each thread
-  // keeps its own search hints: they change the cost of a search, never its hits.
+  // so the rows of the footprint may go to different threads.
   std::int64_t bilinear = 0, weighted = 0, none = 0;
   WorkProgress& progress = *pass.progress;
 #pragma omp parallel num_threads(pass.rowThreads) if (pass.rowThreads > 1) \
     reduction(+ : bilinear, weighted, none)
   {
-    SearchHints hints;
     InterpolationCounts counts;
 #pragma omp for schedule(dynamic, 4)
     for (std::int64_t k = pass.kFirst; k <= pass.kLast; ++k) {
@@ -160,7 +154,7 @@ InterpolationCounts interpolateLayer(const LayerPass& pass, std::int32_t level,
       for (std::int64_t j = pass.jFirst; j <= pass.jLast; ++j) {
         if (!isEmptyCell(row[j], deleteValue) || isDryCell(bedRow[j], landValue)) continue;
         row[j] = estimateNode(static_cast<std::int32_t>(j), static_cast<std::int32_t>(k), ws,
-                              hints, pass.reach, deleteValue, counts);
+                              pass.reach, deleteValue, counts);
       }
       progress.poll();
     }

@@ -3,9 +3,9 @@
 
 #include <algorithm>
 #include <cstdint>
+#include <limits>
 
 #include "interp/node_tests.h"
-#include "support/checked_alloc.h"
 
 namespace karnet {
 
@@ -125,154 +125,6 @@ void edgeDistances(std::int32_t j, std::int32_t k, std::int32_t nj, std::int32_t
   edges[3] = std::max(k, nj - 1 - j);
 }
 
-// Number of data nodes in columns jLo..jHi, rows kLo..kHi (inclusive, inside
-// the layer, not empty).
-std::uint32_t rectangleCount(const SearchIndex& index, std::int64_t jLo, std::int64_t jHi,
-                             std::int64_t kLo, std::int64_t kHi) {
-  const std::int64_t w = std::int64_t{index.nj} + 1;
-  const std::uint32_t* below = index.counts + kLo * w;
-  const std::uint32_t* above = index.counts + (kHi + 1) * w;
-  return above[jHi + 1] - below[jHi + 1] - above[jLo] + below[jLo];
-}
-
-// Number of data nodes of the quadrant within rings 1..r (clipped to the layer).
-std::uint32_t quadrantCount(const SearchIndex& index, std::int32_t j, std::int32_t k,
-                            const Quadrant& q, std::int64_t r) {
-  // Offsets a*u + b*v with a in 1..r and b in 0..r: the images of the corners
-  // (1, 0) and (r, r) bound the rectangle.
-  const std::int64_t j1 = j + q.uj, k1 = k + q.uk;
-  const std::int64_t j2 = j + r * (q.uj + q.vj), k2 = k + r * (q.uk + q.vk);
-  const std::int64_t jLo = std::max<std::int64_t>(std::min(j1, j2), 0);
-  const std::int64_t jHi = std::min<std::int64_t>(std::max(j1, j2), index.nj - 1);
-  const std::int64_t kLo = std::max<std::int64_t>(std::min(k1, k2), 0);
-  const std::int64_t kHi = std::min<std::int64_t>(std::max(k1, k2), index.nk - 1);
-  if (jLo > jHi || kLo > kHi) return 0;
-  return rectangleCount(index, jLo, jHi, kLo, kHi);
-}
-
-// First ring 1..rings of the quadrant that holds data, or 0 when none does.
-// The search starts at the hint (any value; clamped to 1..rings): a hint that
-// is right costs two counts, otherwise the answer is bracketed by galloping
-// away from it and then narrowed by halving.
-std::int64_t firstDataRing(const SearchIndex& index, std::int32_t j, std::int32_t k,
-                           const Quadrant& q, std::int64_t rings, std::int64_t hint) {
-  const std::int64_t start = std::clamp<std::int64_t>(hint, 1, rings);
-  std::int64_t empty = 0;  // rings 1..empty hold no data
-  std::int64_t full = 0;   // rings 1..full hold data
-  if (quadrantCount(index, j, k, q, start) != 0) {
-    full = start;
-    for (std::int64_t step = 1; full - step > 0; step *= 2) {
-      if (quadrantCount(index, j, k, q, full - step) == 0) {
-        empty = full - step;
-        break;
-      }
-      full -= step;
-    }
-  } else {
-    empty = start;
-    for (std::int64_t step = 1; full == 0; step *= 2) {
-      if (empty == rings) return 0;
-      const std::int64_t probe = std::min(rings, empty + step);
-      if (quadrantCount(index, j, k, q, probe) != 0) {
-        full = probe;
-      } else {
-        empty = probe;
-      }
-    }
-  }
-  while (full - empty > 1) {
-    const std::int64_t mid = empty + (full - empty) / 2;
-    if (quadrantCount(index, j, k, q, mid) == 0) {
-      empty = mid;
-    } else {
-      full = mid;
-    }
-  }
-  return full;
-}
-
-// Number of data nodes at sj + t*dj, sk + t*dk for t = tFirst .. tLast
-// (clipped to the layer).
-std::uint32_t legCount(const SearchIndex& index, std::int64_t sj, std::int64_t sk,
-                       std::int32_t dj, std::int32_t dk, std::int64_t tFirst, std::int64_t tLast) {
-  std::int64_t lo = tFirst;
-  std::int64_t hi = tLast;
-  clipAxis(sj, dj, index.nj, lo, hi);
-  clipAxis(sk, dk, index.nk, lo, hi);
-  if (lo > hi) return 0;
-  const std::int64_t ja = sj + lo * dj, jb = sj + hi * dj;
-  const std::int64_t ka = sk + lo * dk, kb = sk + hi * dk;
-  return rectangleCount(index, std::min(ja, jb), std::max(ja, jb), std::min(ka, kb),
-                        std::max(ka, kb));
-}
-
-// Legs shorter than this are scanned node by node; longer ones are halved
-// with leg counts.
-constexpr std::int64_t kScannedLegLength = 16;
-
-// As scanLeg, with long legs searched through the count table: the first t
-// holding data is found by halving.
-std::int64_t findOnLeg(const LayerView& layer, const SearchIndex& index, std::int64_t sj,
-                       std::int64_t sk, std::int32_t dj, std::int32_t dk, std::int64_t tFirst,
-                       std::int64_t tLast) {
-  std::int64_t lo = tFirst;
-  std::int64_t hi = tLast;
-  clipAxis(sj, dj, layer.nj, lo, hi);
-  clipAxis(sk, dk, layer.nk, lo, hi);
-  if (hi - lo < kScannedLegLength) return scanLeg(layer, sj, sk, dj, dk, lo, hi);
-  if (legCount(index, sj, sk, dj, dk, lo, hi) == 0) return -1;
-  while (lo < hi) {  // the first hit lies in lo..hi
-    const std::int64_t mid = lo + (hi - lo) / 2;
-    if (legCount(index, sj, sk, dj, dk, lo, mid) != 0) {
-      hi = mid;
-    } else {
-      lo = mid + 1;
-    }
-  }
-  return lo;
-}
-
-// As scanRing, with long legs searched through the count table.
-bool findOnRing(const LayerView& layer, const SearchIndex& index, std::int32_t j, std::int32_t k,
-                const Quadrant& q, std::int64_t r, std::int32_t& hj, std::int32_t& hk) {
-  return firstOnRing(
-      j, k, q, r,
-      [&layer, &index](std::int64_t sj, std::int64_t sk, std::int32_t dj, std::int32_t dk,
-                       std::int64_t tFirst, std::int64_t tLast) {
-        return findOnLeg(layer, index, sj, sk, dj, dk, tFirst, tLast);
-      },
-      hj, hk);
-}
-
-// Tells whether node (hj, hk), in practice the previous search's hit, is the
-// quadrant's first data node within rings 1..rings: it must hold data and lie
-// in the quadrant on some ring r <= rings, and neither rings 1..r-1 nor the
-// part of ring r scanned before it may hold data. If so, stores r in ring.
-bool confirmHit(const LayerView& layer, const SearchIndex& index, std::int32_t j,
-                std::int32_t k, const Quadrant& q, std::int64_t rings, std::int32_t hj,
-                std::int32_t hk, std::int64_t& ring) {
-  if (hj < 0 || hj >= layer.nj || hk < 0 || hk >= layer.nk) return false;
-  // The node's offset is a*u + b*v; it lies in the quadrant when a >= 1, b >= 0.
-  const std::int64_t dj = std::int64_t{hj} - j, dk = std::int64_t{hk} - k;
-  const std::int64_t a = dj * q.uj + dk * q.uk;
-  const std::int64_t b = dj * q.vj + dk * q.vk;
-  if (a < 1 || b < 0) return false;
-  const std::int64_t r = std::max(a, b);
-  if (r > rings || isEmptyCell(layer.data[hk * layer.nj + hj], layer.deleteValue)) return false;
-  if (r > 1 && quadrantCount(index, j, k, q, r - 1) != 0) return false;
-  // Leg A: node + r*u + t*v, t = 0 .. r-1 (the node is on it when b < r);
-  // leg B: node + t*u + r*v, t = 1 .. r.
-  const bool onLegA = b < r;
-  if (legCount(index, j + r * q.uj, k + r * q.uk, q.vj, q.vk, 0, onLegA ? b - 1 : r - 1) != 0) {
-    return false;
-  }
-  if (!onLegA && legCount(index, j + r * q.vj, k + r * q.vk, q.uj, q.uk, 1, a - 1) != 0) {
-    return false;
-  }
-  ring = r;
-  return true;
-}
-
 }  // namespace
 
 float searchReach(const RunSettings& settings) { return settings.SearchRadius / settings.dx; }
@@ -298,74 +150,172 @@ std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, fl
   return count;
 }
 
-std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
-                    double deleteValue, const SearchIndex& index, SearchHints& hints,
-                    std::int32_t* jHit, std::int32_t* kHit) {
-  const LayerView view{layer.data, layer.nj, layer.nk, deleteValue};
+namespace {
+
+// Axis directions of the distance tables, and the two each quadrant's rings
+// run along (u, v as in kQuadrants).
+constexpr std::int32_t kDirJ[4] = {1, -1, 0, 0};
+constexpr std::int32_t kDirK[4] = {0, 0, 1, -1};
+constexpr int kUDir[4] = {0, 2, 1, 3};
+constexpr int kVDir[4] = {2, 1, 3, 0};
+
+// Largest grid side whose distances fit 16 bits (the largest value marks "none").
+constexpr std::int32_t kNarrowSide = 65535;
+
+}  // namespace
+
+SearchTables::SearchTables(std::int32_t nj, std::int32_t nk)
+    : nj_(std::max(nj, 0)), nk_(std::max(nk, 0)), wide_(std::max(nj, nk) > kNarrowSide) {
+  const std::size_t size = static_cast<std::size_t>(nj_) * static_cast<std::size_t>(nk_);
+  for (int i = 0; i < 4; ++i) {
+    if (wide_) {
+      wide32_.along[i].resize(size);
+      wide32_.quadrant[i].resize(size);
+    } else {
+      narrow16_.along[i].resize(size);
+      narrow16_.quadrant[i].resize(size);
+    }
+  }
+}
+
+void SearchTables::build(const FloatGrid2D& layer, double deleteValue, int threads) {
+  if (layer.nj != nj_ || layer.nk != nk_) return;
+  if (wide_) {
+    fill(wide32_, layer, deleteValue, threads);
+  } else {
+    fill(narrow16_, layer, deleteValue, threads);
+  }
+}
+
+template <typename T>
+void SearchTables::fill(Distances<T>& d, const FloatGrid2D& layer, double deleteValue,
+                        int threads) {
+  constexpr T kNone = std::numeric_limits<T>::max();
+  const std::int64_t nj = nj_, nk = nk_;
+  const float* data = layer.data;
+  // Distances never reach kNone: they are below the grid's larger side.
+  auto alongAxis = [&](int dir) {
+    T* out = d.along[dir].data();
+    if (kDirK[dir] == 0) {
+      const bool rightward = kDirJ[dir] > 0;
+      for (std::int64_t k = 0; k < nk; ++k) {
+        T next = kNone;
+        for (std::int64_t i = 0; i < nj; ++i) {
+          const std::int64_t p = k * nj + (rightward ? nj - 1 - i : i);
+          if (!isEmptyCell(data[p], deleteValue)) {
+            next = 0;
+          } else if (next != kNone) {
+            ++next;
+          }
+          out[p] = next;
+        }
+      }
+    } else {
+      const bool upward = kDirK[dir] > 0;
+      for (std::int64_t i = 0; i < nk; ++i) {
+        const std::int64_t k = upward ? nk - 1 - i : i;
+        const std::int64_t before = upward ? k + 1 : k - 1;  // the row already done
+        const bool first = before < 0 || before >= nk;
+        for (std::int64_t j = 0; j < nj; ++j) {
+          const std::int64_t p = k * nj + j;
+          T next = kNone;
+          if (!isEmptyCell(data[p], deleteValue)) {
+            next = 0;
+          } else if (!first && out[before * nj + j] != kNone) {
+            next = static_cast<T>(out[before * nj + j] + 1);
+          }
+          out[p] = next;
+        }
+      }
+    }
+  };
+  // First data ring of quadrant q at every node: the least of the diagonal
+  // neighbour's (plus one), the first data along u from the neighbour at u and
+  // the first data along v from the diagonal neighbour (each plus one).
+  auto quadrantRings = [&](int q) {
+    const Quadrant& quad = kQuadrants[q];
+    const T* alongU = d.along[kUDir[q]].data();
+    const T* alongV = d.along[kVDir[q]].data();
+    T* out = d.quadrant[q].data();
+    const std::int32_t wj = quad.uj + quad.vj, wk = quad.uk + quad.vk;
+    for (std::int64_t ik = 0; ik < nk; ++ik) {
+      const std::int64_t k = wk > 0 ? nk - 1 - ik : ik;
+      for (std::int64_t ij = 0; ij < nj; ++ij) {
+        const std::int64_t j = wj > 0 ? nj - 1 - ij : ij;
+        std::uint64_t best = kNone;
+        const std::int64_t uj = j + quad.uj, uk = k + quad.uk;
+        if (uj >= 0 && uj < nj && uk >= 0 && uk < nk && alongU[uk * nj + uj] != kNone) {
+          best = std::uint64_t{alongU[uk * nj + uj]} + 1;
+        }
+        const std::int64_t dj = j + wj, dk = k + wk;
+        if (dj >= 0 && dj < nj && dk >= 0 && dk < nk) {
+          const std::int64_t diagonal = dk * nj + dj;
+          if (alongV[diagonal] != kNone) best = std::min<std::uint64_t>(best, alongV[diagonal] + 1u);
+          if (out[diagonal] != kNone) best = std::min<std::uint64_t>(best, out[diagonal] + 1u);
+        }
+        out[k * nj + j] = static_cast<T>(std::min<std::uint64_t>(best, kNone));
+      }
+    }
+  };
+#pragma omp parallel num_threads(threads) if (threads > 1)
+  {
+#pragma omp for schedule(static, 1)
+    for (int dir = 0; dir < 4; ++dir) alongAxis(dir);
+#pragma omp for schedule(static, 1)
+    for (int q = 0; q < 4; ++q) quadrantRings(q);
+  }
+}
+
+std::int32_t SearchTables::search(std::int32_t j, std::int32_t k, float reach,
+                                  std::int32_t* jHit, std::int32_t* kHit) const {
+  return wide_ ? find(wide32_, j, k, reach, jHit, kHit) : find(narrow16_, j, k, reach, jHit, kHit);
+}
+
+template <typename T>
+std::int32_t SearchTables::find(const Distances<T>& d, std::int32_t j, std::int32_t k,
+                                float reach, std::int32_t* jHit, std::int32_t* kHit) const {
+  constexpr T kNone = std::numeric_limits<T>::max();
+  const std::int64_t nj = nj_, nk = nk_;
+  const std::int64_t node = std::int64_t{k} * nj + j;
   std::int32_t edges[4];
-  edgeDistances(j, k, layer.nj, layer.nk, edges);
+  edgeDistances(j, k, nj_, nk_, edges);
   std::int32_t count = 0;
-  for (int quadrant = 0; quadrant < 4; ++quadrant) {
-    const std::int64_t rings = ringLimit(edges[quadrant], reach);
-    if (rings < 1) continue;
-    const Quadrant& q = kQuadrants[quadrant];
-    std::int32_t hj = hints.jHit[quadrant], hk = hints.kHit[quadrant];
-    std::int64_t ring = 0;
-    bool found = confirmHit(view, index, j, k, q, rings, hj, hk, ring);
+  for (int q = 0; q < 4; ++q) {
+    const std::int32_t rings = ringLimit(edges[q], reach);
+    const T ring = d.quadrant[q][static_cast<std::size_t>(node)];
+    if (rings < 1 || ring == kNone || std::int64_t{ring} > rings) continue;
+    const Quadrant& quad = kQuadrants[q];
+    const std::int64_t r = ring;
+    // Leg A of the ring: node + r*u + t*v, t = 0 .. r-1.
+    std::int64_t hj = j + r * quad.uj, hk = k + r * quad.uk;
+    bool found = false;
+    if (hj >= 0 && hj < nj && hk >= 0 && hk < nk) {
+      const T t = d.along[kVDir[q]][static_cast<std::size_t>(hk * nj + hj)];
+      if (t != kNone && t < r) {
+        hj += t * quad.vj;
+        hk += t * quad.vk;
+        found = true;
+      }
+    }
+    // Leg B: node + t*u + r*v, t = 1 .. r; the ring's data is there.
     if (!found) {
-      ring = firstDataRing(index, j, k, q, rings, hints.ring[quadrant]);
-      found = ring != 0 && findOnRing(view, index, j, k, q, ring, hj, hk);
+      hj = j + quad.uj + r * quad.vj;
+      hk = k + quad.uk + r * quad.vk;
+      if (hj >= 0 && hj < nj && hk >= 0 && hk < nk) {
+        const T t = d.along[kUDir[q]][static_cast<std::size_t>(hk * nj + hj)];
+        if (t != kNone && t < r) {
+          hj += t * quad.uj;
+          hk += t * quad.uk;
+          found = true;
+        }
+      }
     }
-    // With no data in reach the limit is kept, so that the next call checks it first.
-    hints.ring[quadrant] = static_cast<std::int32_t>(found ? ring : rings);
-    if (found) {
-      hints.jHit[quadrant] = hj;
-      hints.kHit[quadrant] = hk;
-      ++count;
-      jHit[count] = hj;
-      kHit[count] = hk;
-    }
+    if (!found) continue;  // tables that do not match the layer find nothing
+    ++count;
+    jHit[count] = static_cast<std::int32_t>(hj);
+    kHit[count] = static_cast<std::int32_t>(hk);
   }
   return count;
-}
-
-std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
-                    double deleteValue, const SearchIndex& index, std::int32_t* jHit,
-                    std::int32_t* kHit) {
-  SearchHints hints;
-  return search(j, k, layer, reach, deleteValue, index, hints, jHit, kHit);
-}
-
-void searchIndexAlloc(SearchIndex& index, std::int32_t nj, std::int32_t nk) {
-  index.nj = std::max(nj, 0);
-  index.nk = std::max(nk, 0);
-  index.counts = checkedAllocArray<std::uint32_t>(
-      static_cast<std::uint64_t>(index.nj + std::int64_t{1}) *
-      static_cast<std::uint64_t>(index.nk + std::int64_t{1}));
-}
-
-void searchIndexFree(SearchIndex& index) {
-  if (index.counts != nullptr) checkedFree(index.counts);
-  index.counts = nullptr;
-}
-
-void searchIndexBuild(SearchIndex& index, const FloatGrid2D& layer, double deleteValue) {
-  const std::int64_t nj = index.nj;
-  const std::int64_t nk = index.nk;
-  const std::int64_t w = nj + 1;
-  std::uint32_t* c = index.counts;
-  std::fill(c, c + w, 0u);
-  for (std::int64_t k = 0; k < nk; ++k) {
-    const float* row = layer.data + k * nj;
-    const std::uint32_t* below = c + k * w;
-    std::uint32_t* here = c + (k + 1) * w;
-    std::uint32_t rowCount = 0;
-    here[0] = 0;
-    for (std::int64_t j = 0; j < nj; ++j) {
-      rowCount += isEmptyCell(row[j], deleteValue) ? 0u : 1u;
-      here[j + 1] = below[j + 1] + rowCount;
-    }
-  }
 }
 
 }  // namespace karnet

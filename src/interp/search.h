@@ -2,6 +2,7 @@
 #define KARNET_INTERP_SEARCH_H_
 
 #include <cstdint>
+#include <vector>
 
 #include "params/run_settings.h"
 #include "support/float_grid.h"
@@ -25,47 +26,45 @@ float searchReach(const RunSettings& settings);
 std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
                     double deleteValue, std::int32_t* jHit, std::int32_t* kHit);
 
-// Count table of the data nodes of one layer, so that a search can tell in
-// constant time whether a quadrant holds data within r rings and skip the
-// empty rings. counts has (nj + 1) * (nk + 1) entries: entry (k, j) at
-// k * (nj + 1) + j is the number of data nodes in columns 0..j-1, rows 0..k-1.
-// The caller owns the storage (searchIndexAlloc / searchIndexFree) and rebuilds
-// the table whenever the layer changes.
-struct SearchIndex {
-  std::int32_t nj = 0;
-  std::int32_t nk = 0;
-  std::uint32_t* counts = nullptr;
+// Distance tables of one layer that answer a search in constant time: for
+// each of the four axis directions the distance to the nearest data node
+// along it, and for each quadrant the first ring holding data (a quadrant's
+// rings 1..r around a node are the node's neighbour diagonally into the
+// quadrant with its rings 1..r-1, plus the row and the column the quadrant
+// starts with, so one sweep per quadrant fills the table). Distances are held
+// in 16 bits where every distance in the layer fits, else in 32.
+class SearchTables {
+ public:
+  SearchTables(std::int32_t nj, std::int32_t nk);
+  SearchTables(const SearchTables&) = delete;
+  SearchTables& operator=(const SearchTables&) = delete;
+
+  // Fills the tables from layer (nj x nk, as given to the constructor), on
+  // up to `threads` threads.
+  void build(const FloatGrid2D& layer, double deleteValue, int threads = 1);
+
+  // The search above, for the layer the tables were built from: the same hits.
+  std::int32_t search(std::int32_t j, std::int32_t k, float reach, std::int32_t* jHit,
+                      std::int32_t* kHit) const;
+
+ private:
+  template <typename T>
+  struct Distances {
+    std::vector<T> along[4];    // +j, -j, +k, -k
+    std::vector<T> quadrant[4];  // Q1..Q4
+  };
+  template <typename T>
+  void fill(Distances<T>& d, const FloatGrid2D& layer, double deleteValue, int threads);
+  template <typename T>
+  std::int32_t find(const Distances<T>& d, std::int32_t j, std::int32_t k, float reach,
+                    std::int32_t* jHit, std::int32_t* kHit) const;
+
+  std::int32_t nj_;
+  std::int32_t nk_;
+  bool wide_;  // 32-bit distances
+  Distances<std::uint16_t> narrow16_;
+  Distances<std::uint32_t> wide32_;
 };
-
-// Storage for a table of an nj x nk layer, from the checked allocator.
-void searchIndexAlloc(SearchIndex& index, std::int32_t nj, std::int32_t nk);
-void searchIndexFree(SearchIndex& index);
-// Fills the table from layer (whose counts must equal the index's).
-void searchIndexBuild(SearchIndex& index, const FloatGrid2D& layer, double deleteValue);
-
-// What earlier searches over a layer found, per quadrant: the last hit and the
-// last first data ring (or the ring limit, when no data was in reach).
-// Neighbouring nodes mostly share their hits, so a search first checks the last
-// hit exactly against the count table, and failing that looks for the first
-// data ring outward or inward from the last one. Any content gives the same
-// hits, only the cost differs. The caller keeps one per walk over a layer.
-struct SearchHints {
-  std::int32_t jHit[4] = {-1, -1, -1, -1};
-  std::int32_t kHit[4] = {-1, -1, -1, -1};
-  std::int32_t ring[4] = {1, 1, 1, 1};
-};
-
-// The same search, with the hits found through the count table of the layer.
-// Gives exactly the hits of the plain search, reading far fewer nodes when the
-// data lie far away. Starts from the hints and updates them.
-std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
-                    double deleteValue, const SearchIndex& index, SearchHints& hints,
-                    std::int32_t* jHit, std::int32_t* kHit);
-
-// The same with fresh hints, for a single search.
-std::int32_t search(std::int32_t j, std::int32_t k, const FloatGrid2D& layer, float reach,
-                    double deleteValue, const SearchIndex& index, std::int32_t* jHit,
-                    std::int32_t* kHit);
 
 }  // namespace karnet
 

@@ -1,5 +1,5 @@
 // Quadrant neighbour search: scan order, quadrant membership, edge distances
-// and reach, and the agreement of the table-assisted search with the plain one.
+// and reach, and the agreement of the table search with the plain one.
 #include "interp/search.h"
 
 #include <gtest/gtest.h>
@@ -28,16 +28,14 @@ struct Layer {
   FloatGrid2D grid;
 };
 
-// Runs the plain search, or the table-assisted one when given the table (with
-// the hints when given them); entry 0 and the entries past the count must be
-// left alone.
+// Runs the plain search, or the table search when given the tables; entry 0
+// and the entries past the count must be left alone.
 Hits find(const Layer& layer, std::int32_t j, std::int32_t k, float reach,
-          const SearchIndex* index = nullptr, SearchHints* hints = nullptr) {
+          const SearchTables* tables = nullptr) {
   std::int32_t jHit[kHitListSize] = {-7, -7, -7, -7, -7}, kHit[kHitListSize] = {-7, -7, -7, -7, -7};
-  const std::int32_t n =
-      !index  ? search(j, k, layer.grid, reach, kDelete, jHit, kHit)
-      : hints ? search(j, k, layer.grid, reach, kDelete, *index, *hints, jHit, kHit)
-              : search(j, k, layer.grid, reach, kDelete, *index, jHit, kHit);
+  const std::int32_t n = tables == nullptr
+                             ? search(j, k, layer.grid, reach, kDelete, jHit, kHit)
+                             : tables->search(j, k, reach, jHit, kHit);
   EXPECT_TRUE(n >= 0 && n <= 4) << n;
   Hits hits;
   for (int i = 0; i < kHitListSize; ++i) {
@@ -52,12 +50,10 @@ Hits find(const Layer& layer, std::int32_t j, std::int32_t k, float reach,
 
 // Both searches on the layer; they must agree.
 Hits findBoth(const Layer& layer, std::int32_t j, std::int32_t k, float reach) {
-  SearchIndex index;
-  searchIndexAlloc(index, layer.grid.nj, layer.grid.nk);
-  searchIndexBuild(index, layer.grid, kDelete);
+  SearchTables tables(layer.grid.nj, layer.grid.nk);
+  tables.build(layer.grid, kDelete);
   const Hits plain = find(layer, j, k, reach);
-  EXPECT_EQ(find(layer, j, k, reach, &index), plain);
-  searchIndexFree(index);
+  EXPECT_EQ(find(layer, j, k, reach, &tables), plain);
   return plain;
 }
 
@@ -88,8 +84,7 @@ TEST(Search, HandWorkedOrderQuadrantsEdgesAndReach) {
       {"reach truncates to whole rings", 9, 9, {{7, 4}, {4, 6}}, 4, 4, 2.9f, {{4, 6}}},
       {"reach 3 takes ring 3", 9, 9, {{7, 4}, {4, 6}}, 4, 4, 3, {{7, 4}, {4, 6}}},
       {"reach below one", 5, 5, {{3, 2}, {1, 2}}, 2, 2, 0.99f, {}},
-      // One node per quadrant far out: the table skips the empty rings. Q1's
-      // lies on ring 80, Q3's on ring 95.
+      // One node per quadrant far out: Q1's lies on ring 80, Q3's on ring 95.
       {"far data", 200, 150, far, 100, 75, 1000, far},
       {"far data, reach 80.5", 200, 150, far, 100, 75, 80.5f, {far[0], far[1], far[3]}},
   };
@@ -128,9 +123,8 @@ Hits ringWalk(const FloatGrid2D& g, std::int32_t j, std::int32_t k, float reach)
   return hits;
 }
 
-// The searches agree with the ring walk at every node of random layers: the
-// plain one, the table-assisted one from fresh hints, and the table-assisted
-// one keeping its hints over a walk in memory order and then in random order.
+// The searches agree with the ring walk at every node of random layers, the
+// table search with tables built on one thread and on three.
 TEST(Search, PlainAndTableSearchesAgreeWithTheRingWalkOnRandomLayers) {
   std::mt19937 random(20240611);
   const std::int32_t shapes[][2] = {{1, 1}, {1, 17}, {23, 1}, {9, 9}, {31, 12}, {40, 45}};
@@ -143,32 +137,41 @@ TEST(Search, PlainAndTableSearchesAgreeWithTheRingWalkOnRandomLayers) {
       std::bernoulli_distribution put(density);
       for (std::size_t node = 0; node < layer.values.size(); ++node)
         if (put(random)) layer.values[node] = static_cast<float>(node);
-      SearchIndex index;
-      searchIndexAlloc(index, shape[0], shape[1]);
-      searchIndexBuild(index, layer.grid, kDelete);
-      std::vector<std::int32_t> order(static_cast<std::size_t>(2 * shape[0] * shape[1]));
-      for (std::size_t i = 0; i < order.size(); ++i)
-        order[i] = static_cast<std::int32_t>(i % (order.size() / 2));
-      std::shuffle(order.begin() + order.size() / 2, order.end(), random);
+      SearchTables tables(shape[0], shape[1]);
+      tables.build(layer.grid, kDelete, compared % 2 == 0 ? 1 : 3);
       for (float reach : reaches) {
-        SearchHints hints;
-        for (std::size_t i = 0; i < order.size(); ++i) {
-          const std::int32_t j = order[i] % shape[0], k = order[i] / shape[0];
-          const Hits expected = ringWalk(layer.grid, j, k, reach);
-          SCOPED_TRACE(::testing::Message() << j << "," << k << " reach " << reach);
-          ASSERT_EQ(find(layer, j, k, reach, &index, &hints), expected);
-          if (i >= order.size() / 2) continue;
-          ASSERT_EQ(find(layer, j, k, reach), expected);
-          ASSERT_EQ(find(layer, j, k, reach, &index), expected);
-          ++compared;
-          nonEmpty += expected.empty() ? 0 : 1;
+        for (std::int32_t k = 0; k < shape[1]; ++k) {
+          for (std::int32_t j = 0; j < shape[0]; ++j) {
+            const Hits expected = ringWalk(layer.grid, j, k, reach);
+            SCOPED_TRACE(::testing::Message() << j << "," << k << " reach " << reach);
+            ASSERT_EQ(find(layer, j, k, reach), expected);
+            ASSERT_EQ(find(layer, j, k, reach, &tables), expected);
+            ++compared;
+            nonEmpty += expected.empty() ? 0 : 1;
+          }
         }
       }
-      searchIndexFree(index);
     }
   }
   EXPECT_GT(compared, 10000);
   EXPECT_GT(nonEmpty, compared / 4);
+}
+
+// A layer wider than 65535 nodes keeps its distances in 32 bits: data 70000
+// nodes away is found where it lies.
+TEST(Search, TablesOfAVeryWideLayer) {
+  Layer layer(70002, 2);
+  layer.set(70001, 1);
+  layer.set(0, 0);
+  layer.set(35000, 1);
+  SearchTables tables(70002, 2);
+  tables.build(layer.grid, kDelete, 2);
+  for (const auto& node : Hits{{1, 0}, {1, 1}, {34999, 0}, {35001, 1}, {70000, 0}}) {
+    SCOPED_TRACE(::testing::Message() << node.first << "," << node.second);
+    EXPECT_EQ(find(layer, node.first, node.second, 1e6f, &tables),
+              find(layer, node.first, node.second, 1e6f));
+  }
+  EXPECT_EQ(find(layer, 1, 0, 1e6f, &tables), (Hits{{35000, 1}, {0, 0}}));
 }
 
 }  // namespace
