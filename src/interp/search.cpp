@@ -187,27 +187,68 @@ void SearchTables::build(const FloatGrid2D& layer, double deleteValue, int threa
   }
 }
 
+namespace {
+
+// One node further than x; "none" stays "none".
+template <typename T>
+inline T oneFurther(T x) {
+  return static_cast<T>(x + static_cast<T>(x != std::numeric_limits<T>::max()));
+}
+
+// row[j] = source[j + shift] where that lies in 0..n-1, else "none".
+template <typename T>
+void takeShifted(T* row, const T* source, std::int64_t shift, std::int64_t n) {
+  constexpr T kNone = std::numeric_limits<T>::max();
+  if (source == nullptr) {
+    std::fill(row, row + n, kNone);
+  } else if (shift == 0) {
+    std::copy(source, source + n, row);
+  } else if (shift > 0) {
+    for (std::int64_t j = 0; j + 1 < n; ++j) row[j] = source[j + 1];
+    if (n > 0) row[n - 1] = kNone;
+  } else {
+    for (std::int64_t j = 1; j < n; ++j) row[j] = source[j - 1];
+    if (n > 0) row[0] = kNone;
+  }
+}
+
+// row[j] = min(row[j], a[j + shift], b[j + shift]) where j + shift lies in 0..n-1.
+template <typename T>
+void lowerShifted(T* row, const T* a, const T* b, std::int64_t shift, std::int64_t n) {
+  const std::int64_t first = shift < 0 ? 1 : 0;
+  const std::int64_t last = shift > 0 ? n - 2 : n - 1;
+  for (std::int64_t j = first; j <= last; ++j) {
+    row[j] = std::min(row[j], std::min(a[j + shift], b[j + shift]));
+  }
+}
+
+}  // namespace
+
 template <typename T>
 void SearchTables::fill(Distances<T>& d, const FloatGrid2D& layer, double deleteValue,
                         int threads) {
   constexpr T kNone = std::numeric_limits<T>::max();
   const std::int64_t nj = nj_, nk = nk_;
   const float* data = layer.data;
-  // Distances never reach kNone: they are below the grid's larger side.
+  // A cell is empty when its value widened equals the delete value; that can
+  // only be when the delete value is a float, and then the float comparison
+  // gives the same answer.
+  const float hole = static_cast<float>(deleteValue);
+  const bool holes = static_cast<double>(hole) == deleteValue;
+  auto holds = [hole, holes](float v) { return !(holes && v == hole); };
+  // Distances never reach "none": they are below the grid's larger side.
   auto alongAxis = [&](int dir) {
     T* out = d.along[dir].data();
     if (kDirK[dir] == 0) {
       const bool rightward = kDirJ[dir] > 0;
       for (std::int64_t k = 0; k < nk; ++k) {
+        const float* values = data + k * nj;
+        T* row = out + k * nj;
         T next = kNone;
         for (std::int64_t i = 0; i < nj; ++i) {
-          const std::int64_t p = k * nj + (rightward ? nj - 1 - i : i);
-          if (!isEmptyCell(data[p], deleteValue)) {
-            next = 0;
-          } else if (next != kNone) {
-            ++next;
-          }
-          out[p] = next;
+          const std::int64_t j = rightward ? nj - 1 - i : i;
+          next = holds(values[j]) ? T{0} : oneFurther(next);
+          row[j] = next;
         }
       }
     } else {
@@ -215,23 +256,23 @@ void SearchTables::fill(Distances<T>& d, const FloatGrid2D& layer, double delete
       for (std::int64_t i = 0; i < nk; ++i) {
         const std::int64_t k = upward ? nk - 1 - i : i;
         const std::int64_t before = upward ? k + 1 : k - 1;  // the row already done
-        const bool first = before < 0 || before >= nk;
-        for (std::int64_t j = 0; j < nj; ++j) {
-          const std::int64_t p = k * nj + j;
-          T next = kNone;
-          if (!isEmptyCell(data[p], deleteValue)) {
-            next = 0;
-          } else if (!first && out[before * nj + j] != kNone) {
-            next = static_cast<T>(out[before * nj + j] + 1);
+        const float* values = data + k * nj;
+        T* row = out + k * nj;
+        if (before < 0 || before >= nk) {
+          for (std::int64_t j = 0; j < nj; ++j) row[j] = holds(values[j]) ? T{0} : kNone;
+        } else {
+          const T* previous = out + before * nj;
+          for (std::int64_t j = 0; j < nj; ++j) {
+            row[j] = holds(values[j]) ? T{0} : oneFurther(previous[j]);
           }
-          out[p] = next;
         }
       }
     }
   };
-  // First data ring of quadrant q at every node: the least of the diagonal
-  // neighbour's (plus one), the first data along u from the neighbour at u and
-  // the first data along v from the diagonal neighbour (each plus one).
+  // First data ring of quadrant q at every node, row by row: one further than
+  // the least of the first data along u from the neighbour at u, the first
+  // data along v from the diagonal neighbour (at u + v) and the diagonal
+  // neighbour's own first ring. The diagonal neighbours lie in the row before.
   auto quadrantRings = [&](int q) {
     const Quadrant& quad = kQuadrants[q];
     const T* alongU = d.along[kUDir[q]].data();
@@ -240,21 +281,16 @@ void SearchTables::fill(Distances<T>& d, const FloatGrid2D& layer, double delete
     const std::int32_t wj = quad.uj + quad.vj, wk = quad.uk + quad.vk;
     for (std::int64_t ik = 0; ik < nk; ++ik) {
       const std::int64_t k = wk > 0 ? nk - 1 - ik : ik;
-      for (std::int64_t ij = 0; ij < nj; ++ij) {
-        const std::int64_t j = wj > 0 ? nj - 1 - ij : ij;
-        std::uint64_t best = kNone;
-        const std::int64_t uj = j + quad.uj, uk = k + quad.uk;
-        if (uj >= 0 && uj < nj && uk >= 0 && uk < nk && alongU[uk * nj + uj] != kNone) {
-          best = std::uint64_t{alongU[uk * nj + uj]} + 1;
-        }
-        const std::int64_t dj = j + wj, dk = k + wk;
-        if (dj >= 0 && dj < nj && dk >= 0 && dk < nk) {
-          const std::int64_t diagonal = dk * nj + dj;
-          if (alongV[diagonal] != kNone) best = std::min<std::uint64_t>(best, alongV[diagonal] + 1u);
-          if (out[diagonal] != kNone) best = std::min<std::uint64_t>(best, out[diagonal] + 1u);
-        }
-        out[k * nj + j] = static_cast<T>(std::min<std::uint64_t>(best, kNone));
+      const std::int64_t before = k + wk;
+      const bool hasBefore = before >= 0 && before < nk;
+      T* row = out + k * nj;
+      if (quad.uk == 0) {
+        takeShifted(row, alongU + k * nj, quad.uj, nj);
+      } else {
+        takeShifted(row, hasBefore ? alongU + before * nj : nullptr, 0, nj);
       }
+      if (hasBefore) lowerShifted(row, alongV + before * nj, out + before * nj, wj, nj);
+      for (std::int64_t j = 0; j < nj; ++j) row[j] = oneFurther(row[j]);
     }
   };
 #pragma omp parallel num_threads(threads) if (threads > 1)
