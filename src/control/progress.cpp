@@ -64,12 +64,10 @@ void progressReport(std::int64_t done) {
 
 int progressCheckCancel() {
   handlePendingSignal();
-  // A cancel asked for on the first rank of a run over several reaches the
-  // others here; each then ends as the first does.
-  if (apvCancel() != 0 || ranksCancelAnnounced()) {
-    ranksAnnounceCancel();
-    throw RunError::cancelled();
-  }
+  // In a run over several processes, the end of another (its error, a signal
+  // sent to it, a cancel) reaches this one here; it then ends the same way.
+  ranksCheckEnd();
+  if (apvCancel() != 0) throw RunError::cancelled();
   return 0;
 }
 

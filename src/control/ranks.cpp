@@ -8,8 +8,15 @@
 #include <time.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdio>
+#include <cstring>
+#include <functional>
 #include <string>
+#include <utility>
+#include <vector>
+
+#include "support/run_error.h"
 
 #ifdef KARNET_WITH_MPI
 // The C interface only, also when compiled as C++.
@@ -27,16 +34,37 @@ int rankTotal = 1;
 bool joined = false;
 bool finished = false;
 bool endAgreed = false;
-// The ending ranks meet here, apart from the run's own collectives, so that a
-// rank that ends early never meets one of those by mistake.
+// The ending ranks meet here, and the news of an end travels here, apart from
+// the run's own messages, so that neither is ever taken for the other.
 MPI_Comm endComm = MPI_COMM_NULL;
-constexpr int kCancelTag = 1;
-bool cancelAnnounced = false;
+// The run's small exchanges (sums, the agreement on the end), apart from the
+// levels, which travel on MPI_COMM_WORLD tagged by their slot.
+MPI_Comm runComm = MPI_COMM_NULL;
+constexpr int kEndTag = 1;
+constexpr int kSumTag = 2;
+constexpr int kAgreeTag = 3;
+// The news of an end: how the rank that sent it ends.
+constexpr std::size_t kEndTextSize = 2048;
+struct EndNews {
+  std::int32_t kind;
+  std::int32_t exitCode;
+  char message[kEndTextSize];
+  char notice[kEndTextSize];
+};
+// This rank has told the others of its end, or learned of another's.
+bool endAnnounced = false;
+bool endHeard = false;
+// Sent without waiting: the news and the data of a send given up at an end
+// stay here until the process ends, where MPI may still read them.
+EndNews outgoingNews;
+std::vector<float> outgoingFloats;
+std::function<void()> waitingCheck;
 // A follower's own standard error stream, and the file its messages go to.
 int followerStderr = -1;
 std::FILE* keptMessages = nullptr;
-// How long an ending rank waits for the others to end as well.
-constexpr double kEndWaitSeconds = 5.0;
+// How long an ending rank waits for the others to end as well (they learn of
+// the end at their next progress check).
+constexpr double kEndWaitSeconds = 30.0;
 #endif
 
 }  // namespace
@@ -77,6 +105,7 @@ void ranksInit(int* argc, char*** argv) {
   MPI_Comm_rank(MPI_COMM_WORLD, &ownRank);
   MPI_Comm_size(MPI_COMM_WORLD, &rankTotal);
   MPI_Comm_dup(MPI_COMM_WORLD, &endComm);
+  MPI_Comm_dup(MPI_COMM_WORLD, &runComm);
 #else
   (void)argc;
   (void)argv;
@@ -94,29 +123,159 @@ void ranksFinish() {
 int rankIndex() { return ownRank; }
 int rankCount() { return rankTotal; }
 
+void ranksSetWaitingCheck(std::function<void()> check) {
+#ifdef KARNET_WITH_MPI
+  waitingCheck = std::move(check);
+#else
+  (void)check;
+#endif
+}
+
+#ifdef KARNET_WITH_MPI
+namespace {
+
+// Messages longer than an int can count go in pieces.
+constexpr std::size_t kPiece = std::size_t{1} << 30;
+
+RunError errorFrom(const EndNews& news) {
+  std::string message(news.message, strnlen(news.message, kEndTextSize));
+  std::string notice(news.notice, strnlen(news.notice, kEndTextSize));
+  RunError error = RunError::fatal(message, news.exitCode);
+  switch (static_cast<RunError::Kind>(news.kind)) {
+    case RunError::Kind::kLogged:
+      error = RunError::logged(message, news.exitCode);
+      break;
+    case RunError::Kind::kMemory:
+      error = RunError::memory(message);
+      break;
+    case RunError::Kind::kCancelled:
+      error = RunError::cancelled();
+      break;
+    case RunError::Kind::kFatal:
+      break;
+  }
+  return notice.empty() ? error : std::move(error).withNotice(notice);
+}
+
+// The news of another rank's end, when some has come.
+bool newsArrived(EndNews& news) {
+  int arrived = 0;
+  MPI_Status status;
+  MPI_Iprobe(MPI_ANY_SOURCE, kEndTag, endComm, &arrived, &status);
+  if (arrived == 0) return false;
+  MPI_Recv(&news, sizeof news, MPI_BYTE, status.MPI_SOURCE, kEndTag, endComm, MPI_STATUS_IGNORE);
+  return true;
+}
+
+// Gives up a request this rank no longer waits for: a receive is cancelled,
+// a send left to go (its data stays where it is until the process ends).
+void giveUp(MPI_Request& request, bool receive) {
+  if (request == MPI_REQUEST_NULL) return;
+  if (receive) {
+    MPI_Cancel(&request);
+    MPI_Wait(&request, MPI_STATUS_IGNORE);
+  } else {
+    MPI_Request_free(&request);
+  }
+}
+
+// Waits for the request, looking meanwhile for the end of another rank and
+// running the waiting check; either may end the wait by throwing, after the
+// request was given up.
+void waitFor(MPI_Request& request, bool receive) {
+  long pauseNs = 20000;
+  for (;;) {
+    int done = 0;
+    MPI_Test(&request, &done, MPI_STATUS_IGNORE);
+    if (done != 0) return;
+    try {
+      ranksCheckEnd();
+      if (waitingCheck) waitingCheck();
+    } catch (...) {
+      giveUp(request, receive);
+      throw;
+    }
+    struct timespec pause = {0, pauseNs};
+    nanosleep(&pause, nullptr);
+    pauseNs = std::min(pauseNs * 2, 1000000L);
+  }
+}
+
+void send(const void* data, int count, MPI_Datatype type, int to, int tag, MPI_Comm comm) {
+  MPI_Request request = MPI_REQUEST_NULL;
+  MPI_Isend(data, count, type, to, tag, comm, &request);
+  waitFor(request, false);
+}
+
+void receive(void* data, int count, MPI_Datatype type, int from, int tag, MPI_Comm comm) {
+  MPI_Request request = MPI_REQUEST_NULL;
+  MPI_Irecv(data, count, type, from, tag, comm, &request);
+  waitFor(request, true);
+}
+
+}  // namespace
+#endif
+
+void ranksAnnounceEnd(const RunError& error) {
+#ifdef KARNET_WITH_MPI
+  if (!joined || finished || rankTotal == 1 || endAnnounced || endHeard) return;
+  endAnnounced = true;
+  std::memset(&outgoingNews, 0, sizeof outgoingNews);
+  outgoingNews.kind = static_cast<std::int32_t>(error.kind());
+  outgoingNews.exitCode = error.exitCode();
+  std::strncpy(outgoingNews.message, error.message().c_str(), kEndTextSize - 1);
+  std::strncpy(outgoingNews.notice, error.notice().c_str(), kEndTextSize - 1);
+  for (int r = 0; r < rankTotal; ++r) {
+    if (r == ownRank) continue;
+    MPI_Request request = MPI_REQUEST_NULL;
+    MPI_Isend(&outgoingNews, sizeof outgoingNews, MPI_BYTE, r, kEndTag, endComm, &request);
+    MPI_Request_free(&request);
+  }
+#else
+  (void)error;
+#endif
+}
+
+void ranksCheckEnd() {
+#ifdef KARNET_WITH_MPI
+  if (!joined || finished || rankTotal == 1 || endAnnounced || endHeard) return;
+  EndNews news;
+  if (!newsArrived(news)) return;
+  endHeard = true;
+  throw errorFrom(news);
+#endif
+}
+
 void ranksSum(std::int64_t* values, int count) {
 #ifdef KARNET_WITH_MPI
   if (!joined || finished || rankTotal == 1 || count <= 0) return;
-  MPI_Allreduce(MPI_IN_PLACE, values, count, MPI_INT64_T, MPI_SUM, MPI_COMM_WORLD);
+  // Gathered to rank 0, summed in rank order and sent back: point to point,
+  // so that a rank that ends meanwhile leaves no one waiting.
+  if (ownRank != 0) {
+    send(values, count, MPI_INT64_T, 0, kSumTag, runComm);
+    receive(values, count, MPI_INT64_T, 0, kSumTag, runComm);
+    return;
+  }
+  std::vector<std::int64_t> part(static_cast<std::size_t>(count));
+  for (int r = 1; r < rankTotal; ++r) {
+    receive(part.data(), count, MPI_INT64_T, r, kSumTag, runComm);
+    for (int i = 0; i < count; ++i) values[i] += part[static_cast<std::size_t>(i)];
+  }
+  for (int r = 1; r < rankTotal; ++r) send(values, count, MPI_INT64_T, r, kSumTag, runComm);
 #else
   (void)values;
   (void)count;
 #endif
 }
 
-#ifdef KARNET_WITH_MPI
-namespace {
-// Messages longer than an int can count go in pieces.
-constexpr std::size_t kPiece = std::size_t{1} << 30;
-}  // namespace
-#endif
-
 void ranksSendFloats(const float* data, std::size_t count, int to, int tag) {
 #ifdef KARNET_WITH_MPI
+  // Sent from a copy that outlives a send given up at an end.
+  outgoingFloats.assign(data, data + count);
   std::size_t done = 0;
   do {
     const std::size_t n = count - done < kPiece ? count - done : kPiece;
-    MPI_Send(data + done, static_cast<int>(n), MPI_FLOAT, to, tag, MPI_COMM_WORLD);
+    send(outgoingFloats.data() + done, static_cast<int>(n), MPI_FLOAT, to, tag, MPI_COMM_WORLD);
     done += n;
   } while (done < count);
 #else
@@ -132,8 +291,7 @@ void ranksReceiveFloats(float* data, std::size_t count, int from, int tag) {
   std::size_t done = 0;
   do {
     const std::size_t n = count - done < kPiece ? count - done : kPiece;
-    MPI_Recv(data + done, static_cast<int>(n), MPI_FLOAT, from, tag, MPI_COMM_WORLD,
-             MPI_STATUS_IGNORE);
+    receive(data + done, static_cast<int>(n), MPI_FLOAT, from, tag, MPI_COMM_WORLD);
     done += n;
   } while (done < count);
 #else
@@ -147,13 +305,21 @@ void ranksReceiveFloats(float* data, std::size_t count, int from, int tag) {
 std::int32_t ranksAgreeOnEnd(std::int32_t ownCode) {
 #ifdef KARNET_WITH_MPI
   if (joined && !finished && rankTotal > 1) {
-    // The lowest rank with a code speaks for all: its rank first, then its code.
-    int speaker = ownCode >= 0 ? ownRank : std::numeric_limits<int>::max();
-    MPI_Allreduce(MPI_IN_PLACE, &speaker, 1, MPI_INT, MPI_MIN, MPI_COMM_WORLD);
-    endAgreed = true;
-    if (speaker == std::numeric_limits<int>::max()) return -1;
+    // Rank 0 collects every rank's code and hands back that of the lowest
+    // rank with one (-1 when none has one).
     std::int32_t code = ownCode;
-    MPI_Bcast(&code, 1, MPI_INT32_T, speaker, MPI_COMM_WORLD);
+    if (ownRank != 0) {
+      send(&code, 1, MPI_INT32_T, 0, kAgreeTag, runComm);
+      receive(&code, 1, MPI_INT32_T, 0, kAgreeTag, runComm);
+    } else {
+      for (int r = 1; r < rankTotal; ++r) {
+        std::int32_t theirs = -1;
+        receive(&theirs, 1, MPI_INT32_T, r, kAgreeTag, runComm);
+        if (code < 0) code = theirs;
+      }
+      for (int r = 1; r < rankTotal; ++r) send(&code, 1, MPI_INT32_T, r, kAgreeTag, runComm);
+    }
+    endAgreed = true;
     return code;
   }
 #endif
@@ -202,36 +368,6 @@ void showKeptMessages(std::int32_t exitCode) {
 
 }  // namespace
 #endif
-
-void ranksAnnounceCancel() {
-#ifdef KARNET_WITH_MPI
-  if (!joined || finished || ownRank != 0 || cancelAnnounced) return;
-  cancelAnnounced = true;
-  static int word = 1;
-  for (int r = 1; r < rankTotal; ++r) {
-    MPI_Request request = MPI_REQUEST_NULL;
-    MPI_Isend(&word, 1, MPI_INT, r, kCancelTag, endComm, &request);
-    MPI_Request_free(&request);
-  }
-#endif
-}
-
-bool ranksCancelAnnounced() {
-#ifdef KARNET_WITH_MPI
-  if (!joined || finished || ownRank == 0) return false;
-  if (cancelAnnounced) return true;
-  int arrived = 0;
-  MPI_Iprobe(0, kCancelTag, endComm, &arrived, MPI_STATUS_IGNORE);
-  if (arrived != 0) {
-    int word = 0;
-    MPI_Recv(&word, 1, MPI_INT, 0, kCancelTag, endComm, MPI_STATUS_IGNORE);
-    cancelAnnounced = true;
-  }
-  return cancelAnnounced;
-#else
-  return false;
-#endif
-}
 
 void ranksEnd(std::int32_t exitCode) {
 #ifdef KARNET_WITH_MPI

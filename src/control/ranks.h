@@ -3,8 +3,11 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 
 namespace karnet {
+
+class RunError;
 
 // The processes of one run. A run started by an MPI launcher (mpirun, srun)
 // is shared out over its ranks; a run started plainly is one process, rank 0
@@ -39,7 +42,9 @@ void ranksSum(std::int64_t* values, int count);
 bool ranksQuietFollower();
 
 // Sends count floats to rank `to` / receives them from rank `from`; tag
-// tells the messages of one pair apart. Blocking, in the order called.
+// tells the messages of one pair apart. They return in the order called, once
+// the message has gone or come; while they wait, the end of another rank is
+// looked for (see ranksCheckEnd) and the waiting check runs.
 void ranksSendFloats(const float* data, std::size_t count, int to, int tag);
 void ranksReceiveFloats(float* data, std::size_t count, int from, int tag);
 
@@ -58,10 +63,19 @@ std::int32_t ranksAgreeOnEnd(std::int32_t ownCode);
 // alone then shows what it kept of its standard error stream.
 void ranksEnd(std::int32_t exitCode);
 
-// A cancel of the run: rank 0 tells every other rank (once, without
-// waiting); the others look whether it did, without waiting either.
-void ranksAnnounceCancel();
-bool ranksCancelAnnounced();
+// How the ranks learn that one of them ends: the first rank to end for a
+// reason of its own (an error, a signal sent to it, a cancel) tells every
+// other rank how (the kind, message and exit code), without waiting; each
+// other rank ends the same way when it next looks: at its progress checks
+// and in every wait on another rank. A rank that ends because another told it
+// tells nobody. Harmless in a plain run.
+void ranksAnnounceEnd(const RunError& error);
+// Throws the end another rank announced, once; returns when none did.
+void ranksCheckEnd();
+
+// Runs in every wait on another rank, so that the waiting rank still sees a
+// cancel or a signal (it may throw a RunError, which ends the wait).
+void ranksSetWaitingCheck(std::function<void()> check);
 
 // Ends every rank of the job at once with the code, from any one rank: for a
 // failure that the other ranks cannot know of.

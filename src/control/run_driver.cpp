@@ -150,6 +150,8 @@ void freeRunArrays(RunState& state) {
 
 void runDriver(Run& run) {
   installSignalHandlers();
+  // An interrupt reaches a process also while it waits on another.
+  ranksSetWaitingCheck(handlePendingSignal);
   runInitialise(run.state, contextOf(run));
   RunSummary summary;
   std::string writeProblem;

@@ -13,6 +13,7 @@
 #include "control/host.h"
 #include "control/log.h"
 #include "control/ranks.h"
+#include "support/run_error.h"
 
 namespace karnet {
 namespace {
@@ -91,6 +92,8 @@ void fatalError(const char* message, const std::int32_t* exitCode) {
 }
 
 void endRun(const RunError& error) {
+  // The other processes of a run over several end the same way.
+  ranksAnnounceEnd(error);
   if (!error.notice().empty()) {
     std::fputs(error.notice().c_str(), stderr);
     std::fflush(stderr);

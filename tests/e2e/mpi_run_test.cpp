@@ -4,6 +4,7 @@
 #include <signal.h>
 
 #include <filesystem>
+#include <functional>
 #include <map>
 #include <sstream>
 #include <string>
@@ -131,25 +132,25 @@ TEST_F(MpiRun, CrossValidationIsRefusedOverSeveralRanks) {
             std::string::npos);
 }
 
-// The process of rank 0 of the job working in dir, or 0.
-int rankZeroIn(const std::string& dir) {
+// The process of rank `rank` of the job working in dir, or 0.
+int rankIn(const std::string& dir, int rank) {
+  const std::string mark = "OMPI_COMM_WORLD_RANK=" + std::to_string(rank);
   std::error_code ignored;
   for (const auto& entry : std::filesystem::directory_iterator("/proc", ignored)) {
     const std::string name = entry.path().filename().string();
     if (name.find_first_not_of("0123456789") != std::string::npos) continue;
     if (std::filesystem::read_symlink(entry.path() / "cwd", ignored) != dir) continue;
     const std::string environment = readFile(entry.path().string() + "/environ");
-    if (environment.find(std::string("OMPI_COMM_WORLD_RANK=0") + '\0') != std::string::npos ||
-        environment.rfind("OMPI_COMM_WORLD_RANK=0", 0) == 0) {
+    if (environment.find('\0' + mark + '\0') != std::string::npos ||
+        environment.rfind(mark + '\0', 0) == 0) {
       return std::stoi(name);
     }
   }
   return 0;
 }
 
-TEST_F(MpiRun, CancelOnRankZeroEndsEveryRank) {
-  // A basin large enough to be cancelled while its levels are analysed.
-  TempDir dir;
+// A basin large enough to be interrupted while its levels are analysed.
+void writeSlowCase(const TempDir& dir) {
   BathymetrySpec b;
   b.nx = b.ny = 300;
   b.spacing = 100.0;
@@ -171,19 +172,29 @@ TEST_F(MpiRun, CancelOnRankZeroEndsEveryRank) {
   p.spacing = "1.5";
   p.correlationSampleSize = "30";
   writeFile(dir.file("case.pfs"), p.render());
+}
 
+// Once the levels are being analysed, sends the signal to one rank alone.
+std::function<bool(int)> signalRankOnceAnalysing(const TempDir& dir, int rank, int number,
+                                                 bool& signalled) {
+  return [&dir, rank, number, &signalled](int) {
+    if (readFile(dir.file("case.log")).find("Basic grid parameters") == std::string::npos) {
+      return false;
+    }
+    const int process = rankIn(dir.path(), rank);
+    if (process != 0) signalled = kill(process, number) == 0;
+    return signalled;
+  };
+}
+
+TEST_F(MpiRun, CancelOnRankZeroEndsEveryRank) {
+  TempDir dir;
+  writeSlowCase(dir);
   bool signalled = false;
-  const ProcessResult run = runProgram(
-      KARNET_MPIEXEC, {"-np", "2", KARNET_BINARY, "//apv", "case.pfs"}, dir.path(), kEnvironment,
-      [&](int) {
-        // Once the levels are being analysed, rank 0 alone is asked to cancel.
-        if (readFile(dir.file("case.log")).find("Basic grid parameters") == std::string::npos) {
-          return false;
-        }
-        const int rankZero = rankZeroIn(dir.path());
-        if (rankZero != 0) signalled = kill(rankZero, SIGUSR1) == 0;
-        return signalled;
-      });
+  // Rank 0 alone is asked to cancel.
+  const ProcessResult run =
+      runProgram(KARNET_MPIEXEC, {"-np", "2", KARNET_BINARY, "//apv", "case.pfs"}, dir.path(),
+                 kEnvironment, signalRankOnceAnalysing(dir, 0, SIGUSR1, signalled));
   ASSERT_TRUE(signalled);
   // Every rank ended as rank 0 did and left the job: mpirun reports 0 only then.
   EXPECT_EQ(run.exitCode, 0) << run.err;
@@ -191,6 +202,46 @@ TEST_F(MpiRun, CancelOnRankZeroEndsEveryRank) {
   const std::string log = readFile(dir.file("case.log"));
   EXPECT_EQ(log.find("Statistics for local grid"), std::string::npos);
   EXPECT_NE(log.find("Completion code : Successful"), std::string::npos);
+}
+
+// An interrupt sent to one rank other than 0 ends every rank as it ends a plain
+// run: rank 0 logs the signal's message and the abnormal end, every process
+// exits with the signal's number, and no result file appears.
+TEST_F(MpiRun, SignalToOneRankEndsEveryRankWithItsMessageAndCode) {
+  TempDir dir;
+  writeSlowCase(dir);
+  bool signalled = false;
+  const ProcessResult run =
+      runProgram(KARNET_MPIEXEC, {"-np", "3", KARNET_BINARY, "case.pfs"}, dir.path(),
+                 kEnvironment, signalRankOnceAnalysing(dir, 2, SIGTERM, signalled));
+  ASSERT_TRUE(signalled);
+  EXPECT_EQ(run.exitCode, SIGTERM) << run.err;
+  EXPECT_NE(run.err.find("karnet: Termination reques"), std::string::npos) << run.err;
+  EXPECT_EQ(run.err.find("stopped alone"), std::string::npos) << run.err;
+  EXPECT_FALSE(fileExists(dir.file("result.nc")));
+  const std::string log = readFile(dir.file("case.log"));
+  EXPECT_NE(log.find("Termination reques"), std::string::npos) << log;
+  EXPECT_NE(log.find("Completion code : Abnormal"), std::string::npos) << log;
+}
+
+// A rank that cannot get the memory for its levels (here the one whose
+// process may use less) ends every rank with the memory failure of a plain
+// run, with exit code 1.
+TEST_F(MpiRun, MemoryFailureOnOneRankEndsEveryRank) {
+  TempDir dir;
+  writeSlowCase(dir);
+  // Each rank holds about 14 levels of 300 x 300 nodes (about 5 MB per grid);
+  // rank 1 may have 40 MB of data, too little for its grids and workspaces.
+  const std::string launch = std::string("if [ \"$OMPI_COMM_WORLD_RANK\" = 1 ]; then ulimit -d 40000; fi; exec ") +
+                             KARNET_BINARY + " case.pfs";
+  const ProcessResult run = runProgram(
+      KARNET_MPIEXEC, {"-np", "3", "/bin/sh", "-c", launch}, dir.path(), kEnvironment);
+  EXPECT_EQ(run.exitCode, 1) << run.err;
+  EXPECT_EQ(run.err.find("stopped alone"), std::string::npos) << run.err;
+  EXPECT_FALSE(fileExists(dir.file("result.nc")));
+  const std::string log = readFile(dir.file("case.log"));
+  EXPECT_NE(log.find("Completion code : Abnormal"), std::string::npos) << log;
+  EXPECT_EQ(log.find("Statistics for local grid"), std::string::npos) << log;
 }
 
 }  // namespace
