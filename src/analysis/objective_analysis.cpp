@@ -20,6 +20,7 @@
 #include "analysis/objan.h"
 #include "analysis/select_data.h"
 #include "control/log.h"
+#include "control/layer_loop.h"
 #include "control/progress.h"
 #include "control/ranks.h"
 #include "control/threads.h"
@@ -304,27 +305,19 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
   allowNestedTeams();
   std::vector<LayerOutcome> outcomes(static_cast<std::size_t>(layerCount));
 
-#pragma omp parallel num_threads(share.layers) if (share.layers > 1)
-  {
-    std::optional<LayerWorkspace> ws;
-#pragma omp for schedule(dynamic, 1) nowait
-    for (std::int64_t s = held.first; s < held.end(); ++s) {
-      if (progress.stopped()) {
-        progress.itemDone();
-        continue;
-      }
-      const auto l = static_cast<std::int32_t>(lOff + s);
-      LayerOutcome& outcome = outcomes[static_cast<std::size_t>(s)];
-      try {
-        if (!ws.has_value()) ws.emplace(nj, nk);
-        grid3DLayerGet(state.basicBathymetry, l, ws->bed);
-        grid3DLayerGet(state.basicValues, l, ws->values);
-        grid2DCopyWindow(ws->analysis, ws->values);
+  forEachLayer<LayerWorkspace>(
+      held.first, held.end(), share.layers, progress,
+      [&](std::int64_t s, LayerWorkspace& ws) {
+        const auto l = static_cast<std::int32_t>(lOff + s);
+        LayerOutcome& outcome = outcomes[static_cast<std::size_t>(s)];
+        grid3DLayerGet(state.basicBathymetry, l, ws.bed);
+        grid3DLayerGet(state.basicValues, l, ws.values);
+        grid2DCopyWindow(ws.analysis, ws.values);
 
-        const std::int32_t nData = countDataCells(ws->analysis, deleteValue);
+        const std::int32_t nData = countDataCells(ws.analysis, deleteValue);
         outcome.dataCells = nData;
         LayerAnalysisInput input;
-        input.bathymetry = &ws->bed;
+        input.bathymetry = &ws.bed;
         input.landValue = landValue;
         input.deleteValue = deleteValue;
         input.jOff = jOff;
@@ -337,27 +330,20 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
         team.progress = &progress;
         std::int32_t failed = 0;
         outcome.interpolations =
-            analyseLayer(ws->oa, ws->analysis, nData, input, l, failed, settings, team);
+            analyseLayer(ws.oa, ws.analysis, nData, input, l, failed, settings, team);
         outcome.failures = failed;
         outcome.messages = std::move(team.messages);
 
         for (std::int32_t j = jOff; j <= jLast; ++j) {
           for (std::int32_t k = kOff; k <= kLast; ++k) {
             const std::int64_t at = std::int64_t{k} * nj + j;
-            ws->values.data[at] =
-                isDryCell(ws->bed.data[at], landValue) ? deleteCell : ws->analysis.data[at];
+            ws.values.data[at] =
+                isDryCell(ws.bed.data[at], landValue) ? deleteCell : ws.analysis.data[at];
           }
         }
-        grid3DLayerPut(state.basicValues, l, ws->values);
-      } catch (...) {
-        progress.fail(std::current_exception(), s);
-      }
-      progress.itemDone();
-      progress.poll();
-    }
-    progress.watchUntilDone(held.count);
-  }
-  progress.finish();
+        grid3DLayerPut(state.basicValues, l, ws.values);
+      },
+      nj, nk);
 
   // Totals and messages in layer order.
   std::int64_t dataCells = 0;

@@ -12,10 +12,9 @@
 #include <cmath>
 #include <cstdint>
 #include <cstring>
-#include <exception>
-#include <optional>
 #include <vector>
 
+#include "control/layer_loop.h"
 #include "control/log.h"
 #include "control/progress.h"
 #include "control/ranks.h"
@@ -229,35 +228,20 @@ void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int
   allowNestedTeams();
   std::vector<InterpolationCounts> counts(static_cast<std::size_t>(std::max<std::int64_t>(layerCount, 0)));
 
-#pragma omp parallel num_threads(share.layers) if (share.layers > 1)
-  {
-    std::optional<LayerWorkspace> ws;
-#pragma omp for schedule(dynamic, 1) nowait
-    for (std::int64_t s = held.first; s < held.end(); ++s) {
-      if (progress.stopped()) {
-        progress.itemDone();
-        continue;
-      }
-      const std::int64_t lb = lOff + s;
-      const bool inside = lb >= values.l0 && lb < values.l0 + values.nl &&
-                          lb >= bathymetry.l0 && lb < bathymetry.l0 + bathymetry.nl &&
-                          values.layerSize() == bathymetry.layerSize();
-      if (inside) {
-        try {
-          if (!ws.has_value()) ws.emplace(nj, nk);
+  forEachLayer<LayerWorkspace>(
+      held.first, held.end(), share.layers, progress,
+      [&](std::int64_t s, LayerWorkspace& ws) {
+        const std::int64_t lb = lOff + s;
+        const bool inside = lb >= values.l0 && lb < values.l0 + values.nl &&
+                            lb >= bathymetry.l0 && lb < bathymetry.l0 + bathymetry.nl &&
+                            values.layerSize() == bathymetry.layerSize();
+        if (inside) {
           counts[static_cast<std::size_t>(s)] =
-              interpolateLayer(pass, static_cast<std::int32_t>(lb), *ws);
-        } catch (...) {
-          progress.fail(std::current_exception(), s);
+              interpolateLayer(pass, static_cast<std::int32_t>(lb), ws);
         }
-      }
-      progress.add(layerUnits);
-      progress.itemDone();
-      progress.poll();
-    }
-    progress.watchUntilDone(held.count);
-  }
-  progress.finish();
+        progress.add(layerUnits);
+      },
+      nj, nk);
 
   InterpolationCounts total;
   for (const InterpolationCounts& layer : counts) {
