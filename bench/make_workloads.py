@@ -11,9 +11,16 @@
 
 Each folder gets bathymetry.asc, observations.txt and the .pfs files; bathymetry.nc is made
 with karnet-mkgrid (pass its path with --mkgrid, default build/tools/karnet-mkgrid).
-Deterministic: the same files on every run.
+
+  basin    (asked for on its own) a made-up basin for timing and memory runs of any size:
+           a NX x NY bowl of 100 m cells, deepest in the middle, land in one corner; CASTS
+           casts at random water nodes, one value every 5 m from the surface to the bed;
+           LEVELS levels of 5 m; case.pfs (bilinear, or objective with --analysis objective).
+
+Deterministic: the same arguments give the same files.
 
 usage: make_workloads.py [--mkgrid PATH] [--only large|dense] OUTDIR
+       make_workloads.py [--mkgrid PATH] basin NX NY LEVELS CASTS OUTDIR [--analysis A]
 """
 import argparse
 import os
@@ -28,7 +35,7 @@ SPACING = 10.0
 PFS = """// karnet benchmark workload {name}
 [Q4_DIGITIZING_OF_DATA]
    [INPUT_FILES]
-      DataFileName = |observations.txt|
+      DataFileName = |{data}|
       FileName = |bathymetry.nc|
       Projection = 'LOCAL'
    EndSect  // INPUT_FILES
@@ -40,7 +47,7 @@ PFS = """// karnet benchmark workload {name}
 
    [CALCULATION_PARAMETERS]
       SearchRadius = {radius}
-      MaxExtrapolationDistance = 0, 0
+      MaxExtrapolationDistance = {extrapolation}
       Analysis = {analysis}
    EndSect  // CALCULATION_PARAMETERS
 
@@ -48,34 +55,45 @@ PFS = """// karnet benchmark workload {name}
       ZeroCrossingDistance = {zero}
       DecayDistance = {decay}
       ErrorVariance = 10
-      MinData = -5
-      MaxData = 40
-      FilterOperations = 0
+      MinData = {low}
+      MaxData = {high}
+      FilterOperations = {filters}
       CorrelationSampleSize = {css}
-      FilterType = 'shapiro'
+      FilterType = '{filter}'
    EndSect  // OBJECTIVE_ANALYSIS_PARAMETERS
 
    [OUTPUT_DATA]
       FileName = |{result}|
-      Title = 'benchmark {name}'
+      Title = '{title}'
       ItemType = 2
    EndSect  // OUTPUT_DATA
 EndSect  // Q4_DIGITIZING_OF_DATA
 """
 
 
+def write_asc(path, bed):
+    """bed[k, j] (row k = y index from the south) as an ESRI ASCII grid of DX cells."""
+    ny, nx = bed.shape
+    with open(path, "w") as f:
+        f.write("ncols %d\nnrows %d\nxllcenter 0.0\nyllcenter 0.0\ncellsize %.1f\n"
+                "NODATA_value -9999\n" % (nx, ny, DX))
+        # ESRI ASCII rows run from north to south.
+        for row in bed[::-1]:
+            f.write(" ".join("%.1f" % v for v in row) + "\n")
+
+
+def make_bathymetry(mkgrid, folder, asc):
+    subprocess.run([mkgrid, "--projection", "LOCAL", "--orientation", "0", "--title",
+                    "benchmark bathymetry", asc, os.path.join(folder, "bathymetry.nc")],
+                   check=True)
+
+
 def write_case(folder, mkgrid, nx, ny, levels, cells, seed):
     """Bathymetry (-(levels + 5) * SPACING everywhere, all water) and one full cast at each
     of the given flat node numbers; returns nothing."""
     os.makedirs(folder, exist_ok=True)
-    depth = -(levels + 5) * SPACING
     asc = os.path.join(folder, "bathymetry.asc")
-    with open(asc, "w") as f:
-        f.write("ncols %d\nnrows %d\nxllcenter 0.0\nyllcenter 0.0\ncellsize %.1f\n"
-                "NODATA_value -9999\n" % (nx, ny, DX))
-        row = " ".join(["%.1f" % depth] * nx) + "\n"
-        for _ in range(ny):
-            f.write(row)
+    write_asc(asc, np.full((ny, nx), -(levels + 5) * SPACING))
     rng = np.random.default_rng(seed)
     j = cells % nx
     k = cells // nx
@@ -91,14 +109,19 @@ def write_case(folder, mkgrid, nx, ny, levels, cells, seed):
         lines.extend("%.1f %.1f %.1f %.4f" % (a, b, z, v) for a, b, v in zip(x, y, value))
     with open(os.path.join(folder, "observations.txt"), "w") as f:
         f.write("\n".join(lines) + "\n")
-    subprocess.run([mkgrid, "--projection", "LOCAL", "--orientation", "0", "--title",
-                    "benchmark bathymetry", asc, os.path.join(folder, "bathymetry.nc")],
-                   check=True)
+    make_bathymetry(mkgrid, folder, asc)
+
+
+# The settings of the workloads, which a case may change.
+WORKLOAD_SETTINGS = dict(data="observations.txt", spacing=SPACING, extrapolation="0, 0", low=-5,
+                         high=40, filters=0, filter="shapiro")
 
 
 def pfs(folder, name, **fields):
+    settings = dict(WORKLOAD_SETTINGS, title="benchmark " + name)
+    settings.update(fields)
     with open(os.path.join(folder, name + ".pfs"), "w") as f:
-        f.write(PFS.format(name=name, spacing=SPACING, **fields))
+        f.write(PFS.format(name=name, **settings))
 
 
 def large(out, mkgrid):
@@ -138,7 +161,59 @@ def dense(out, mkgrid):
     print("dense workload: %d to %d candidate cells per node" % (counts.min(), counts.max()))
 
 
+def basin(argv, mkgrid):
+    parser = argparse.ArgumentParser(prog="make_workloads.py basin")
+    parser.add_argument("nx", type=int)
+    parser.add_argument("ny", type=int)
+    parser.add_argument("levels", type=int)
+    parser.add_argument("casts", type=int)
+    parser.add_argument("dir")
+    parser.add_argument("--analysis", default="bilinear")
+    args = parser.parse_args(argv)
+    os.makedirs(args.dir, exist_ok=True)
+    spacing = 5.0
+    deepest = spacing * args.levels
+    x = np.linspace(-1.0, 1.0, args.nx)
+    y = np.linspace(-1.0, 1.0, args.ny)
+    xx, yy = np.meshgrid(x, y)
+    bed = -deepest * (1.05 - 0.6 * (xx * xx + yy * yy)) + 8.0 * np.sin(7 * xx) * np.cos(5 * yy)
+    bed[(xx > 0.7) & (yy > 0.7)] = 5.0  # land in the north-east corner
+    bed = np.round(bed, 1)
+    asc = os.path.join(args.dir, "basin.asc")
+    write_asc(asc, bed)
+    rng = np.random.default_rng(20261206)
+    with open(os.path.join(args.dir, "casts.txt"), "w") as f:
+        made = 0
+        while made < args.casts:
+            i = int(rng.integers(0, args.nx))
+            k = int(rng.integers(0, args.ny))
+            b = bed[k, i]
+            if b >= 0:
+                continue
+            made += 1
+            px, py = i * DX + rng.uniform(-20, 20), k * DX + rng.uniform(-20, 20)
+            z = -1.0
+            lines = []
+            while z > b:
+                t = 4.0 + 14.0 * np.exp(z / 60.0) + 0.5 * np.sin(px / 7000.0) \
+                    + 0.3 * np.cos(py / 5000.0)
+                lines.append(f"{px:.1f} {py:.1f} {z:.1f} {t:.3f}\n")
+                z -= spacing
+            f.writelines(lines)
+    pfs(args.dir, "case", data="casts.txt", last=args.levels - 1, spacing=spacing, radius=8000,
+        extrapolation="10, 20", analysis=args.analysis, zero=8000, decay=3000, low=-2, high=30,
+        filters=1, filter="12 pts filter", css=8, result="result.nc", title="large made-up case")
+    make_bathymetry(mkgrid, args.dir, asc)
+
+
 def main():
+    if "basin" in sys.argv[1:]:
+        at = sys.argv.index("basin")
+        front = argparse.ArgumentParser(prog="make_workloads.py")
+        front.add_argument("--mkgrid", default="build/tools/karnet-mkgrid")
+        mkgrid = os.path.abspath(front.parse_args(sys.argv[1:at]).mkgrid)
+        basin(sys.argv[at + 1:], mkgrid)
+        return
     parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
     parser.add_argument("--mkgrid", default="build/tools/karnet-mkgrid")
     parser.add_argument("--only", choices=["large", "dense"])
