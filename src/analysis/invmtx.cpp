@@ -55,27 +55,36 @@ inline std::int32_t pivotKey(float value, std::int32_t notFree) {
   std::int32_t* __restrict free = ws.pivot + 2 * std::int64_t{n};
   std::int32_t freeCount = n;
   for (std::int32_t i = 0; i < n; ++i) free[i] = i;
+  // The greatest pivot key of each free row over the free columns, as the
+  // pivot search needs it: made here for the first step, and for each later
+  // step while the elimination before it writes the row.
+  std::int32_t* __restrict rowKey = ws.pivot + 3 * std::int64_t{n};
+  for (std::int32_t r = 0; r < n; ++r) {
+    const float* __restrict row = rowOf(r);
+    std::int32_t rowBest = -1;
+    for (std::int32_t q = 0; q < n; ++q) {
+      const std::int32_t key = pivotKey(row[q], 0);
+      rowBest = key > rowBest ? key : rowBest;
+    }
+    rowKey[r] = rowBest;
+  }
 
   for (std::int32_t s = 0; s < n; ++s) {
     // Pivot search. The method scans the free entries over columns (outer) and
     // rows (inner) and takes the entry of greatest magnitude, ">=" letting the
     // last of equal magnitudes win: that is the equal-magnitude entry with the
     // greatest column, and within it the greatest row. Here each free row's
-    // greatest key is found over the whole row (used columns masked out), and
-    // only a row that reaches the running maximum is looked at for its last
-    // column holding it. A not-a-number never wins; should every free entry be
-    // one, the first free column and row stand as the pivot.
+    // greatest key over the free columns (rowKey) is compared, and only a row
+    // that reaches the running maximum is looked at for its last column
+    // holding it. A not-a-number never wins; should every free entry be one,
+    // the first free column and row stand as the pivot.
     std::int32_t pivotRow = free[0];
     std::int32_t pivotCol = free[0];
     std::int32_t best = -1;
     for (std::int32_t ri = 0; ri < freeCount; ++ri) {
       const std::int32_t r = free[ri];
       const float* __restrict row = rowOf(r);
-      std::int32_t rowBest = -1;
-      for (std::int32_t q = 0; q < n; ++q) {
-        const std::int32_t key = pivotKey(row[q], ~used[q] >> 31);
-        rowBest = key > rowBest ? key : rowBest;
-      }
+      const std::int32_t rowBest = rowKey[r];
       if (rowBest < best || rowBest < 0) continue;
       std::int32_t col = n - 1;
       while (pivotKey(row[col], ~used[col] >> 31) != rowBest) --col;
@@ -133,14 +142,26 @@ inline std::int32_t pivotKey(float value, std::int32_t notFree) {
       }
     }
 
-    // Elimination of column pc from every other row.
+    // Elimination of column pc from every other row; a row still free takes
+    // its pivot key for the next step on the way.
     const float* __restrict pivotRowValues = rowB;
     for (std::int32_t r = 0; r < n; ++r) {
       if (r == pc) continue;
       float* __restrict row = rowOf(r);
       const float f = row[pc];
-      for (std::int32_t q = 0; q < n; ++q) {
-        row[q] = (q == pc ? 0.0f : row[q]) - f * pivotRowValues[q];
+      if (used[r] < 0) {
+        std::int32_t rowBest = -1;
+        for (std::int32_t q = 0; q < n; ++q) {
+          const float value = (q == pc ? 0.0f : row[q]) - f * pivotRowValues[q];
+          row[q] = value;
+          const std::int32_t key = pivotKey(value, ~used[q] >> 31);
+          rowBest = key > rowBest ? key : rowBest;
+        }
+        rowKey[r] = rowBest;
+      } else {
+        for (std::int32_t q = 0; q < n; ++q) {
+          row[q] = (q == pc ? 0.0f : row[q]) - f * pivotRowValues[q];
+        }
       }
     }
   }

@@ -85,7 +85,7 @@ class NodeScratch {
         selValue_(entries(layer.limit)),
         selCorr_(entries(layer.limit)),
         matrix_(entries(std::int64_t{layer.limit} * layer.limit)),
-        pivot_(entries(3 * std::int64_t{layer.limit})),
+        pivot_(entries(oaPivotEntries(layer.limit))),
         chosen_(entries(layer.limit)) {
     ws.candIndex = candIndex_.data();
     ws.candCorr = candCorr_.data();

@@ -73,7 +73,7 @@ void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::i
   ws.lineCapacity = static_cast<std::int32_t>(line);
   ws.lineBuffer = allocateEntries<float>(line);
 
-  ws.pivot = allocateEntries<std::int32_t>(3 * limit);
+  ws.pivot = allocateEntries<std::int32_t>(oaPivotEntries(limit));
 
   // The table is filled by the very function it stands in for, so a look-up
   // and a direct evaluation give the same bits.

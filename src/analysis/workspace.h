@@ -7,6 +7,9 @@
 
 namespace karnet {
 
+// Indices the matrix inversion keeps for a matrix of row stride limit.
+inline std::int64_t oaPivotEntries(std::int64_t limit) { return 4 * limit; }
+
 // Working storage of the objective analysis for one layer. Every kernel of the
 // analysis receives it explicitly, so separate layers can use separate
 // workspaces. The arrays come from the checked allocator; they exist between
@@ -48,8 +51,9 @@ struct OaWorkspace {
   std::int32_t lineCapacity = 0;
   float* lineBuffer = nullptr;
 
-  // 3 * limit indices of the matrix inversion (pivot records and the list of
-  // free indices), kept here so that no estimate allocates.
+  // oaPivotEntries(limit) indices of the matrix inversion (pivot records, the
+  // list of free indices and the rows' pivot keys), kept here so that no
+  // estimate allocates.
   std::int32_t* pivot = nullptr;
 
   // correlation(d2) for the integral squared distances d2 = 0 .. corrTableSize-1.
