@@ -4,6 +4,7 @@
 #include <libdeflate.h>
 
 #include <algorithm>
+#include <cstdlib>
 #include <atomic>
 #include <bit>
 #include <cstring>
@@ -15,8 +16,11 @@ namespace karnet {
 namespace {
 
 constexpr int kMaxRank = 4;
-// The core driver's growth step of the image.
-constexpr std::size_t kImageIncrement = std::size_t{4} << 20;
+// The core driver's growth step of the image: one byte, so that its buffer
+// always ends where the file does (the closing file writes past the end it
+// had before, and nothing else tells where it ends then). Growing by a
+// reallocation per extension costs little: a file grows a few hundred times.
+constexpr std::size_t kImageIncrement = 1;
 
 // A name for an in-memory image that no file can have: the core driver
 // refuses to open an image under the name of an existing file, and tells
@@ -74,6 +78,49 @@ bool compressShuffledChunk(const float* values, std::size_t count,
 }
 
 namespace {
+
+// The memory of the file's image, allocated as the core driver asks: when the
+// file closes its buffer is kept here instead of freed.
+struct ImageMemory {
+  void* kept = nullptr;
+  std::size_t keptSize = 0;
+  bool keepOnClose = false;
+  // The size of the file's buffer as last allocated: the core driver keeps it
+  // at the file's end exactly (its growth step is one byte).
+  std::size_t fileSize = 0;
+};
+
+void* imageMalloc(std::size_t size, H5FD_file_image_op_t operation, void* data) {
+  if (operation == H5FD_FILE_IMAGE_OP_FILE_OPEN) static_cast<ImageMemory*>(data)->fileSize = size;
+  return std::malloc(size);
+}
+
+void* imageMemcpy(void* to, const void* from, std::size_t size, H5FD_file_image_op_t, void*) {
+  return std::memcpy(to, from, size);
+}
+
+void* imageRealloc(void* block, std::size_t size, H5FD_file_image_op_t operation, void* data) {
+  void* grown = std::realloc(block, size);
+  if (grown != nullptr && operation == H5FD_FILE_IMAGE_OP_FILE_RESIZE) {
+    static_cast<ImageMemory*>(data)->fileSize = size;
+  }
+  return grown;
+}
+
+herr_t imageFree(void* block, H5FD_file_image_op_t operation, void* data) {
+  auto* memory = static_cast<ImageMemory*>(data);
+  if (operation == H5FD_FILE_IMAGE_OP_FILE_CLOSE && memory->keepOnClose && memory->kept == nullptr) {
+    memory->kept = block;
+    memory->keptSize = memory->fileSize;
+  } else {
+    std::free(block);
+  }
+  return 0;
+}
+
+// The property lists that copy the callbacks share the one record.
+void* imageDataCopy(void* data) { return data; }
+herr_t imageDataFree(void*) { return 0; }
 
 struct ItemDataset {
   Handle dataset;
@@ -139,6 +186,8 @@ bool reachStep(hid_t dataset, hsize_t* dims, bool hasTime, std::size_t step) {
 }  // namespace
 
 struct ChunkWriter::Impl {
+  // Declared first, so that it outlives the file that may still free into it.
+  ImageMemory memory;
   Handle file;
   std::vector<ItemDataset> items;
   Handle time;
@@ -156,6 +205,8 @@ ChunkWriter::~ChunkWriter() {
   // Datasets before the file.
   impl_->items.clear();
   impl_->time = Handle();
+  impl_->file = Handle();
+  std::free(impl_->memory.kept);
 }
 
 std::unique_ptr<ChunkWriter> ChunkWriter::open(const void* image, std::size_t size,
@@ -168,7 +219,10 @@ std::unique_ptr<ChunkWriter> ChunkWriter::open(const void* image, std::size_t si
   impl->fill = fillValue;
   {
     const Handle access(H5Pcreate(H5P_FILE_ACCESS), H5Pclose);
+    H5FD_file_image_callbacks_t callbacks = {imageMalloc, imageMemcpy,   imageRealloc, imageFree,
+                                             imageDataCopy, imageDataFree, &impl->memory};
     if (!access.ok() || H5Pset_fapl_core(access.id, kImageIncrement, 0) < 0 ||
+        H5Pset_file_image_callbacks(access.id, &callbacks) < 0 ||
         H5Pset_file_image(access.id, const_cast<void*>(image), size) < 0) {
       return nullptr;
     }
@@ -285,16 +339,17 @@ bool ChunkWriter::writeTime(std::size_t step, double time) {
                   &time) >= 0;
 }
 
-bool ChunkWriter::image(std::vector<unsigned char>& bytes) {
-  if (H5Fflush(impl_->file.id, H5F_SCOPE_LOCAL) < 0) return false;
-  const ssize_t size = H5Fget_file_image(impl_->file.id, nullptr, 0);
-  if (size <= 0) return false;
-  try {
-    bytes.resize(static_cast<std::size_t>(size));
-  } catch (const std::bad_alloc&) {
-    return false;
-  }
-  return H5Fget_file_image(impl_->file.id, bytes.data(), bytes.size()) == size;
+bool ChunkWriter::release(void** bytes, std::size_t* size) {
+  if (!impl_->file.ok()) return false;
+  impl_->items.clear();
+  impl_->time = Handle();
+  impl_->memory.keepOnClose = true;
+  const bool closed = H5Fclose(impl_->file.id) >= 0;
+  impl_->file.id = H5I_INVALID_HID;
+  if (!closed || impl_->memory.kept == nullptr || impl_->memory.keptSize == 0) return false;
+  *bytes = std::exchange(impl_->memory.kept, nullptr);
+  *size = impl_->memory.keptSize;
+  return true;
 }
 
 }  // namespace karnet

@@ -52,8 +52,11 @@ class ChunkWriter {
                    std::int64_t levelCount, const float* data);
   // Stores the time value of step `step`.
   bool writeTime(std::size_t step, double time);
-  // The file's bytes as they stand (into bytes); false when they cannot be had.
-  bool image(std::vector<unsigned char>& bytes);
+  // Closes the file and hands over its bytes: *bytes (to be released with
+  // std::free) and *size. The image is not copied for it, so that a large
+  // result is never in memory twice. false when the file cannot be closed;
+  // the writer takes no more values either way.
+  bool release(void** bytes, std::size_t* size);
 
  private:
   struct Impl;

@@ -680,13 +680,16 @@ int grdFileClose(GrdHeader* header, GrdFile** file, std::string* reason) {
   std::string error;
   bool committed = false;
   if (f->chunks != nullptr) {
-    std::vector<unsigned char> bytes;
-    if (!f->chunks->image(bytes)) {
+    void* bytes = nullptr;
+    std::size_t size = 0;
+    const bool released = f->chunks->release(&bytes, &size);
+    f->chunks.reset();
+    if (!released) {
       if (reason != nullptr) *reason = "its values could not be stored";
       return 1;
     }
-    f->chunks.reset();
-    committed = grdCommitFile(f->finalName, bytes.data(), bytes.size(), &error);
+    committed = grdCommitFile(f->finalName, bytes, size, &error);
+    std::free(bytes);
   } else {
     NC_memio memory{};
     const int status = nc_close_memio(f->ncid, &memory);
