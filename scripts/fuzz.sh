@@ -5,6 +5,9 @@
 #                                             30: the seven harnesses take about 3.5 minutes);
 #                                             all harnesses unless some are named
 #   FUZZ_RUNS=N scripts/fuzz.sh              stops each harness after N inputs instead
+#   FUZZ_TIMEOUT=S                           seconds one input may take (default 20; raise it
+#                                             for long runs beside other work, where a starved
+#                                             process can pass 20 s of wall time on any input)
 # New inputs go to build-fuzz/corpus/<harness>/ (the seeds in tests/fuzz/corpus/ stay as
 # they are); an input that fails is saved in build-fuzz/artifacts/ and the script exits 1.
 set -euo pipefail
@@ -46,7 +49,7 @@ for h in "${harnesses[@]}"; do
   log="build-fuzz/fuzz_$h.log"
   rc=0
   ASAN_OPTIONS=detect_leaks=0:allocator_may_return_null=1:max_allocation_size_mb=2048 UBSAN_OPTIONS=print_stacktrace=1:halt_on_error=1 \
-    "build-fuzz/tests/fuzz/fuzz_$h" "${limit[@]}" -max_len="$max_len" -timeout=20 \
+    "build-fuzz/tests/fuzz/fuzz_$h" "${limit[@]}" -max_len="$max_len" -timeout="${FUZZ_TIMEOUT:-20}" \
     -rss_limit_mb=4096 -malloc_limit_mb=8192 -print_final_stats=1 \
     -artifact_prefix="build-fuzz/artifacts/$h-" \
     "build-fuzz/corpus/$h" "tests/fuzz/corpus/$h" >"$log" 2>&1 || rc=$?
