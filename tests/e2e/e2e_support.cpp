@@ -105,6 +105,20 @@ ProcessResult runKarnet(const std::vector<std::string>& args, const std::string&
   return runProgram(KARNET_BINARY, args, cwd, env, whileRunning);
 }
 
+CaseRun runCase(const TempDir& dir, const std::vector<std::string>& args,
+                const std::map<std::string, std::string>& env,
+                const std::function<bool(int)>& whileRunning) {
+  CaseRun run;
+  static_cast<ProcessResult&>(run) = runKarnet(args, dir.path(), env, whileRunning);
+  const std::string pfs = args.empty() ? "" : args.back();
+  run.log = readFile(dir.file(pfs.substr(0, pfs.rfind('.')) + ".log"));
+  return run;
+}
+
+bool contains(const std::string& text, const std::string& part) {
+  return text.find(part) != std::string::npos;
+}
+
 std::string ParameterFile::render() const {
   auto kept = [this](const std::string& section) {
     for (const auto& name : omit) {
@@ -256,6 +270,26 @@ std::string writeSmallCase(const TempDir& dir, const ParameterFile& parameters) 
   writeFile(dir.file("observations.txt"), obs.str());
   writeFile(dir.file("case.pfs"), parameters.render());
   return obs.str();
+}
+
+std::vector<double> readVariable(const std::string& path, const char* name) {
+  int nc = 0, var = 0, ndims = 0;
+  std::vector<double> values;
+  if (nc_open(path.c_str(), NC_NOWRITE, &nc) != NC_NOERR) return values;
+  if (nc_inq_varid(nc, name, &var) == NC_NOERR && nc_inq_varndims(nc, var, &ndims) == NC_NOERR) {
+    std::vector<int> dims(ndims);
+    nc_inq_vardimid(nc, var, dims.data());
+    std::size_t total = 1;
+    for (int d : dims) {
+      std::size_t length = 0;
+      nc_inq_dimlen(nc, d, &length);
+      total *= length;
+    }
+    values.resize(total);
+    if (nc_get_var_double(nc, var, values.data()) != NC_NOERR) values.clear();
+  }
+  nc_close(nc);
+  return values;
 }
 
 std::vector<float> readResult(const std::string& path, std::string* itemName, int shape[3]) {

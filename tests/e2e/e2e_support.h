@@ -32,6 +32,19 @@ ProcessResult runKarnet(const std::vector<std::string>& args, const std::string&
                         const std::map<std::string, std::string>& env = {},
                         const std::function<bool(int)>& whileRunning = {});
 
+// Batch mode: karnet writes its messages to the log only.
+inline const std::map<std::string, std::string> kBatch = {{"buildmode", "nigth"}};
+
+// A karnet run in dir on the parameter file that ends args, with the log it left there.
+struct CaseRun : ProcessResult {
+  std::string log;
+};
+CaseRun runCase(const TempDir& dir, const std::vector<std::string>& args = {"case.pfs"},
+                const std::map<std::string, std::string>& env = kBatch,
+                const std::function<bool(int)>& whileRunning = {});
+
+bool contains(const std::string& text, const std::string& part);
+
 void writeFile(const std::string& path, const std::string& text);
 std::string readFile(const std::string& path);  // empty when missing
 bool fileExists(const std::string& path);
@@ -43,7 +56,7 @@ std::vector<std::string> splitLines(const std::string& text);
 struct ParameterFile {
   std::string dataFileName = "|observations.txt|";
   std::string fileName = "|bathymetry.nc|";
-  std::string projection = "'UTM-32'";
+  std::string projection = "'LOCAL'";
   std::string zRange = "0, 11";
   std::string spacing = "2.5";
   std::string searchRadius = "2500";
@@ -94,6 +107,9 @@ namespace karnet::e2e {
 // and casts of a temperature that falls with depth and rises towards the east.
 // Returns the observation text it wrote.
 std::string writeSmallCase(const TempDir& dir, const ParameterFile& parameters);
+
+// The values of a NetCDF variable as doubles; empty when the file or the variable is missing.
+std::vector<double> readVariable(const std::string& path, const char* name);
 
 // Reads a result file's only item (time, z, y, x) as floats; shape gets (nz, ny, nx).
 std::vector<float> readResult(const std::string& path, std::string* itemName, int shape[3]);

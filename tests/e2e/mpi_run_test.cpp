@@ -39,7 +39,7 @@ std::string withoutLines(const std::string& text, const std::string& marker,
   return kept;
 }
 
-Outcome runCase(const ParameterFile& parameters, int ranks) {
+Outcome runOver(const ParameterFile& parameters, int ranks) {
   TempDir dir;
   writeSmallCase(dir, parameters);
   Outcome o;
@@ -68,7 +68,7 @@ class MpiRun : public testing::Test {
 
   // Runs plainly and over 2 and 3 ranks; the outcomes must agree.
   void expectSameAsPlain(const ParameterFile& parameters, int exitCode) {
-    const Outcome plain = runCase(parameters, 0);
+    const Outcome plain = runOver(parameters, 0);
     ASSERT_EQ(plain.process.exitCode, exitCode) << plain.process.err;
     if (exitCode == 0) {
       ASSERT_GT(plain.result.size(), 1000u);
@@ -77,7 +77,7 @@ class MpiRun : public testing::Test {
     }
     for (int ranks : {2, 3}) {
       SCOPED_TRACE(testing::Message() << ranks << " ranks");
-      const Outcome shared = runCase(parameters, ranks);
+      const Outcome shared = runOver(parameters, ranks);
       EXPECT_EQ(shared.process.exitCode, plain.process.exitCode) << shared.process.err;
       EXPECT_EQ(shared.karnetLines, plain.karnetLines);
       EXPECT_EQ(shared.log, plain.log);
@@ -86,40 +86,36 @@ class MpiRun : public testing::Test {
   }
 };
 
-TEST_F(MpiRun, BilinearRunGivesThePlainRunsBytes) {
-  ParameterFile p;
-  p.projection = "'LOCAL'";
-  p.filterOperations = "2";
-  expectSameAsPlain(p, 0);
-}
-
-TEST_F(MpiRun, ObjectiveAnalysisFromALevelAboveTheFirst) {
-  ParameterFile p;
-  p.projection = "'LOCAL'";
-  p.analysis = "objective";
-  p.zRange = "3, 11";
-  p.filterType = "'shapiro'";
-  expectSameAsPlain(p, 0);
-}
-
-TEST_F(MpiRun, ResultThatCannotBeWrittenEndsEveryRankWithoutAFile) {
-  ParameterFile p;
-  p.projection = "'LOCAL'";
-  p.outputFileName = "|no such folder/result.nc|";
-  expectSameAsPlain(p, 1);
-}
-
-TEST_F(MpiRun, InvalidSettingsEndEveryRankWithTheSameMessage) {
-  ParameterFile p;
-  p.projection = "'LOCAL'";
-  p.spacing = "0";
-  expectSameAsPlain(p, 1);
+// Runs that complete, and runs that every rank ends with the same error.
+TEST_F(MpiRun, GivesThePlainRunsExitCodeMessagesLogAndBytes) {
+  const struct {
+    const char* name;
+    std::function<void(ParameterFile&)> edit;
+    int exitCode;
+  } cases[] = {
+      {"bilinear", [](ParameterFile& p) { p.filterOperations = "2"; }, 0},
+      {"objective analysis from a level above the first",
+       [](ParameterFile& p) {
+         p.analysis = "objective";
+         p.zRange = "3, 11";
+         p.filterType = "'shapiro'";
+       },
+       0},
+      {"result that cannot be written",
+       [](ParameterFile& p) { p.outputFileName = "|no such folder/result.nc|"; }, 1},
+      {"invalid settings", [](ParameterFile& p) { p.spacing = "0"; }, 1},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    ParameterFile p;
+    c.edit(p);
+    expectSameAsPlain(p, c.exitCode);
+  }
 }
 
 TEST_F(MpiRun, CrossValidationIsRefusedOverSeveralRanks) {
   TempDir dir;
   ParameterFile p;
-  p.projection = "'LOCAL'";
   p.analysis = "objective";
   writeSmallCase(dir, p);
   const ProcessResult run = runProgram(
@@ -166,7 +162,6 @@ void writeSlowCase(const TempDir& dir) {
   }
   writeFile(dir.file("observations.txt"), obs.str());
   ParameterFile p;
-  p.projection = "'LOCAL'";
   p.analysis = "objective";
   p.zRange = "0, 39";
   p.spacing = "1.5";

@@ -40,7 +40,6 @@ void writeCase(const TempDir& dir, ParameterFile p) {
     }
   }
   writeFile(dir.file("observations.txt"), obs.str());
-  p.projection = "'LOCAL'";
   p.zRange = "0, 9";
   p.spacing = "2";
   p.searchRadius = "10000";
@@ -70,15 +69,11 @@ TEST(ObjectiveRun, EveryWetNodeIsTheSmoothedClippedEstimate) {
     ParameterFile p;
     p.filterType = c.filterType;
     p.filterOperations = c.operations;
-    std::ostringstream bound;
-    bound << c.minData;
-    p.minData = bound.str();
-    bound.str("");
-    bound << c.maxData;
-    p.maxData = bound.str();
+    p.minData = std::to_string(c.minData);
+    p.maxData = std::to_string(c.maxData);
     writeCase(dir, p);
-    const ProcessResult r = runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}});
-    ASSERT_EQ(r.exitCode, 0) << readFile(dir.file("case.log"));
+    const CaseRun r = runCase(dir);
+    ASSERT_EQ(r.exitCode, 0) << r.log;
 
     reference::Field expected{kNx, kNy, {}, [](double v) { return std::isnan(v); }};
     for (int j = 0; j < kNy; ++j) {
