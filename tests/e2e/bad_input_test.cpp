@@ -71,14 +71,7 @@ void makeFifo(const std::string& path) {
 
 // The basin of writeSmallCase with every node set to one height.
 void uniformBathymetry(const TempDir& d, float height) {
-  BathymetrySpec b;
-  b.nx = 30;
-  b.ny = 24;
-  b.projection = "LOCAL";
-  b.originLongitude = 1000.0;
-  b.originLatitude = 2000.0;
-  b.heights.assign(30 * 24, height);
-  writeBathymetry(d.file("bathymetry.nc"), b);
+  writeBathymetry(d.file("bathymetry.nc"), localBasin(30, 24, 250.0, height));
 }
 
 using P = ParameterFile&;
@@ -408,14 +401,7 @@ std::vector<BadInput> bathymetryRows() {
        1, "\nERROR while reading bathymetry file\n", "bathymetry.nc: no crs variable with projection"},
       // A single node: neither axis has a spacing.
       {"one node", {},
-       [](D d) {
-         BathymetrySpec b;
-         b.nx = b.ny = 1;
-         b.spacing = 0.0;
-         b.projection = "LOCAL";
-         b.heights.assign(1, -10.0f);
-         writeBathymetry(d.file("bathymetry.nc"), b);
-       },
+       [](D d) { writeBathymetry(d.file("bathymetry.nc"), localBasin(1, 1, 0.0, -10.0f)); },
        1, "dx = 0.000000 dy = 0.000000", "", kAtEcho},
       {"int64 values", {}, nc(typedBathymetry("int64", heights)), 0, kSuccess, "", kResult},
       {"classic format", {}, nc(typedBathymetry("float", heights), "classic"), 0, kSuccess, "",
@@ -423,11 +409,8 @@ std::vector<BadInput> bathymetryRows() {
       // The run takes its projection from the parameter file; the bathymetry's text is not used.
       {"garbage projection in the bathymetry", {},
        [](D d) {
-         BathymetrySpec b;
-         b.nx = 4;
-         b.ny = 3;
+         BathymetrySpec b = localBasin(4, 3, 250.0, -10.0f);
          b.projection = "+proj=nonsense +zone=99";
-         b.heights.assign(12, -10.0f);
          writeBathymetry(d.file("bathymetry.nc"), b);
        },
        0, kSuccess, "", kResult},

@@ -15,14 +15,7 @@ double plane(double x, double y) { return 3.0 + 0.002 * (x - 1000.0) + 0.001 * (
 // A flat 21 x 21 node basin (LOCAL, origin (1000, 2000), 250 m) with casts on every fourth
 // node of a field that is linear in x and y and the same at every depth.
 void writePlaneCase(const TempDir& dir, ParameterFile p) {
-  BathymetrySpec b;
-  b.nx = 21;
-  b.ny = 21;
-  b.projection = "LOCAL";
-  b.originLongitude = 1000.0;
-  b.originLatitude = 2000.0;
-  b.heights.assign(21 * 21, -25.0f);
-  writeBathymetry(dir.file("bathymetry.nc"), b);
+  writeBathymetry(dir.file("bathymetry.nc"), localBasin(21, 21, 250.0, -25.0f));
   std::ostringstream obs;
   obs.precision(17);
   for (int j = 0; j <= 20; j += 4) {

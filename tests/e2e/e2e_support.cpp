@@ -236,17 +236,20 @@ void writeBathymetry(const std::string& path, const BathymetrySpec& grid) {
 
 namespace karnet::e2e {
 
-std::string writeSmallCase(const TempDir& dir, const ParameterFile& parameters) {
+BathymetrySpec localBasin(int nx, int ny, double spacing, float height, double x0, double y0) {
   BathymetrySpec b;
-  b.nx = 30;
-  b.ny = 24;
-  b.spacing = 250.0;
+  b.nx = nx;
+  b.ny = ny;
+  b.spacing = spacing;
   b.projection = "LOCAL";
-  b.originLongitude = 1000.0;
-  b.originLatitude = 2000.0;
-  b.orientation = 0.0;
-  b.landValue = 10.0f;
-  b.heights.resize(static_cast<std::size_t>(b.nx) * b.ny);
+  b.originLongitude = x0;
+  b.originLatitude = y0;
+  b.heights.assign(static_cast<std::size_t>(nx) * ny, height);
+  return b;
+}
+
+std::string writeSmallCase(const TempDir& dir, const ParameterFile& parameters) {
+  BathymetrySpec b = localBasin(30, 24, 250.0, 0.0f);
   for (int j = 0; j < b.ny; ++j) {
     for (int i = 0; i < b.nx; ++i) {
       const bool dry = i >= 25 && j >= 19;

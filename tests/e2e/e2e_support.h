@@ -98,6 +98,11 @@ struct BathymetrySpec {
 };
 void writeBathymetry(const std::string& path, const BathymetrySpec& grid);
 
+// nx x ny nodes of the given spacing, all at one height, in the LOCAL projection (plain metres)
+// with the origin at (x0, y0).
+BathymetrySpec localBasin(int nx, int ny, double spacing, float height, double x0 = 1000.0,
+                          double y0 = 2000.0);
+
 }  // namespace karnet::e2e
 
 namespace karnet::e2e {

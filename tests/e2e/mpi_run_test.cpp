@@ -147,12 +147,7 @@ int rankIn(const std::string& dir, int rank) {
 
 // A basin large enough to be interrupted while its levels are analysed.
 void writeSlowCase(const TempDir& dir) {
-  BathymetrySpec b;
-  b.nx = b.ny = 300;
-  b.spacing = 100.0;
-  b.projection = "LOCAL";
-  b.originLongitude = b.originLatitude = 0.0;
-  b.heights.assign(static_cast<std::size_t>(b.nx) * b.ny, -61.0f);
+  const BathymetrySpec b = localBasin(300, 300, 100.0, -61.0f, 0.0, 0.0);
   writeBathymetry(dir.file("bathymetry.nc"), b);
   std::ostringstream obs;
   for (int j = 5; j < b.ny; j += 10) {

@@ -23,14 +23,9 @@ const std::vector<reference::Cell> kCasts = {{2, 2, 10.0}, {5, 3, 16.0}, {3, 5, 
 // An 8 x 7 node basin of 250 m cells, 25 m deep, with a dry rim (LOCAL, origin
 // (1000, 2000)). Decay length 500 m, zero crossing 1250 m, error variance 10 %.
 void writeCase(const TempDir& dir, ParameterFile p) {
-  BathymetrySpec b;
-  b.nx = kNx;
-  b.ny = kNy;
-  b.projection = "LOCAL";
-  b.originLongitude = 1000.0;
-  b.originLatitude = 2000.0;
+  BathymetrySpec b = localBasin(kNx, kNy, 250.0, -25.0f);
   for (int j = 0; j < kNy; ++j)
-    for (int i = 0; i < kNx; ++i) b.heights.push_back(dry(i, j) ? b.landValue : -25.0f);
+    for (int i = 0; i < kNx; ++i) b.heights[j * kNx + i] = dry(i, j) ? b.landValue : -25.0f;
   writeBathymetry(dir.file("bathymetry.nc"), b);
   std::ostringstream obs;
   for (const auto& cast : kCasts) {

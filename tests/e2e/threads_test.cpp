@@ -35,15 +35,7 @@ std::string withoutCpuTime(const std::string& log) {
 // island and a dry corner, and casts at scattered positions (between nodes) reaching at most
 // castDepth metres down. A fixed generator makes the same case every time.
 void writeBasin(const TempDir& dir, const ParameterFile& parameters, double castDepth) {
-  BathymetrySpec b;
-  b.nx = 90;
-  b.ny = 70;
-  b.spacing = 100.0;
-  b.projection = "LOCAL";
-  b.originLongitude = 0.0;
-  b.originLatitude = 0.0;
-  b.landValue = 10.0f;
-  b.heights.resize(static_cast<std::size_t>(b.nx) * b.ny);
+  BathymetrySpec b = localBasin(90, 70, 100.0, 0.0f, 0.0, 0.0);
   for (int j = 0; j < b.ny; ++j) {
     for (int i = 0; i < b.nx; ++i) {
       const double di = i - 40.0, dj = j - 30.0;
@@ -206,13 +198,7 @@ TEST(ThreadedRun, ThreadCountFromTheSwitchOrTheEnvironment) {
 // 600 x 600 node layer stack.
 void writeSlowCase(const TempDir& dir, const std::string& analysis) {
   const int n = 600;
-  BathymetrySpec b;
-  b.nx = n;
-  b.ny = n;
-  b.spacing = 50.0;
-  b.projection = "LOCAL";
-  b.heights.assign(static_cast<std::size_t>(n) * n, -40.0f);
-  writeBathymetry(dir.file("bathymetry.nc"), b);
+  writeBathymetry(dir.file("bathymetry.nc"), localBasin(n, n, 50.0, -40.0f, 11.3, 55.2));
   std::ostringstream obs;
   for (int j = 0; j < n; j += 20) {
     for (int i = 0; i < n; i += 20) {
