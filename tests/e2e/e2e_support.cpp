@@ -2,6 +2,7 @@
 
 #include <dirent.h>
 #include <fcntl.h>
+#include <netcdf.h>
 #include <signal.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -119,6 +120,14 @@ bool contains(const std::string& text, const std::string& part) {
   return text.find(part) != std::string::npos;
 }
 
+std::string linesStartingWith(const std::string& text, const std::string& prefix, bool keep) {
+  std::string kept;
+  for (const std::string& line : splitLines(text)) {
+    if ((line.rfind(prefix, 0) == 0) == keep) kept += line + "\n";
+  }
+  return kept;
+}
+
 std::string ParameterFile::render() const {
   auto kept = [this](const std::string& section) {
     for (const auto& name : omit) {
@@ -170,12 +179,6 @@ std::string ParameterFile::render() const {
   p << "EndSect  // Q4_DIGITIZING_OF_DATA\n";
   return p.str();
 }
-
-}  // namespace karnet::e2e
-
-#include <netcdf.h>
-
-namespace karnet::e2e {
 
 namespace {
 void check(int status, const char* what) {
@@ -231,10 +234,6 @@ void writeBathymetry(const std::string& path, const BathymetrySpec& grid) {
   check(nc_put_var_float(nc, bVar, grid.heights.data()), "heights");
   check(nc_close(nc), "close");
 }
-
-}  // namespace karnet::e2e
-
-namespace karnet::e2e {
 
 BathymetrySpec localBasin(int nx, int ny, double spacing, float height, double x0, double y0) {
   BathymetrySpec b;

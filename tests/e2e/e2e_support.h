@@ -44,6 +44,12 @@ CaseRun runCase(const TempDir& dir, const std::vector<std::string>& args = {"cas
                 const std::function<bool(int)>& whileRunning = {});
 
 bool contains(const std::string& text, const std::string& part);
+// The lines of text that start with prefix, or (keep false) all the others.
+std::string linesStartingWith(const std::string& text, const std::string& prefix, bool keep = true);
+// A log without its CPU time, the only line that differs between runs of one case.
+inline std::string withoutCpuTime(const std::string& log) {
+  return linesStartingWith(log, "-- CPU time", false);
+}
 
 void writeFile(const std::string& path, const std::string& text);
 std::string readFile(const std::string& path);  // empty when missing
@@ -78,11 +84,6 @@ struct ParameterFile {
   std::string render() const;
 };
 
-}  // namespace karnet::e2e
-
-
-namespace karnet::e2e {
-
 // A bathymetry file in the layout karnet reads, written directly with the NetCDF library.
 // heights holds nx * ny values, x fastest, row 0 at the origin (south-west).
 struct BathymetrySpec {
@@ -97,15 +98,10 @@ struct BathymetrySpec {
   float landValue = 10.0f;
 };
 void writeBathymetry(const std::string& path, const BathymetrySpec& grid);
-
 // nx x ny nodes of the given spacing, all at one height, in the LOCAL projection (plain metres)
 // with the origin at (x0, y0).
 BathymetrySpec localBasin(int nx, int ny, double spacing, float height, double x0 = 1000.0,
                           double y0 = 2000.0);
-
-}  // namespace karnet::e2e
-
-namespace karnet::e2e {
 
 // A small complete case in dir: a 30 x 24 node basin of 250 m cells with a dry corner
 // (land value 10), in the LOCAL projection with its origin at (1000, 2000) and orientation 0,

@@ -30,15 +30,6 @@ struct Outcome {
   std::string karnetLines;  // the lines karnet wrote to stderr
 };
 
-std::string withoutLines(const std::string& text, const std::string& marker,
-                         bool keepMatching) {
-  std::string kept;
-  for (const std::string& line : splitLines(text)) {
-    if ((line.find(marker) != std::string::npos) == keepMatching) kept += line + "\n";
-  }
-  return kept;
-}
-
 Outcome runOver(const ParameterFile& parameters, int ranks) {
   TempDir dir;
   writeSmallCase(dir, parameters);
@@ -49,12 +40,10 @@ Outcome runOver(const ParameterFile& parameters, int ranks) {
     o.process = runProgram(KARNET_MPIEXEC, {"-np", std::to_string(ranks), KARNET_BINARY, "case.pfs"},
                            dir.path(), kEnvironment);
   }
-  o.log = withoutLines(readFile(dir.file("case.log")), "CPU time", false);
+  o.log = withoutCpuTime(readFile(dir.file("case.log")));
   o.result = readFile(dir.file("result.nc"));
   // mpirun adds notes of its own when a rank ends with an error.
-  for (const std::string& line : splitLines(o.process.err)) {
-    if (line.rfind("karnet", 0) == 0) o.karnetLines += line + "\n";
-  }
+  o.karnetLines = linesStartingWith(o.process.err, "karnet");
   return o;
 }
 

@@ -21,16 +21,6 @@ const std::map<std::string, std::string> kNightly = {{"buildmode", "nigth"},
                                                      {"SOURCE_DATE_EPOCH", "1700000000"}};
 const std::string kEarlier = "an earlier result";
 
-// The log without its CPU time line, which is the only line that may differ between runs.
-std::string withoutCpuTime(const std::string& log) {
-  std::string kept;
-  for (const std::string& line : splitLines(log)) {
-    if (line.rfind("-- CPU time", 0) == 0) continue;
-    kept += line + "\n";
-  }
-  return kept;
-}
-
 // A 90 x 70 node basin (LOCAL, 100 m) whose bed deepens eastwards and northwards, with a dry
 // island and a dry corner, and casts at scattered positions (between nodes) reaching at most
 // castDepth metres down. A fixed generator makes the same case every time.
