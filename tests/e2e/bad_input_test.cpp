@@ -71,34 +71,77 @@ void makeFifo(const std::string& path) {
 
 // The basin of writeSmallCase with every node set to one height.
 void uniformBathymetry(const TempDir& d, float height) {
-  BathymetrySpec b;
-  b.nx = 30;
-  b.ny = 24;
-  b.projection = "LOCAL";
-  b.originLongitude = 1000.0;
-  b.originLatitude = 2000.0;
-  b.heights.assign(30 * 24, height);
-  writeBathymetry(d.file("bathymetry.nc"), b);
+  writeBathymetry(d.file("bathymetry.nc"), localBasin(30, 24, 250.0, height));
 }
+
+using P = ParameterFile&;
+using D = const TempDir&;
+using Spoil = std::function<void(D)>;
+
+enum Flags : int {
+  kResult = 1,     // the run writes a result
+  kEmpty = 2,      // every node of that result holds the fill value
+  kNotAsRoot = 4,  // permissions do not bind root
+  kAtEcho = 8,     // the message is the first line after the echo of the parameter file
+};
 
 struct BadInput {
   const char* name;
-  std::function<void(ParameterFile&)> edit;   // before the case is written
-  std::function<void(const TempDir&)> spoil;  // after: may change any file
+  std::function<void(ParameterFile&)> edit;  // before the case is written
+  Spoil spoil;                               // after: may change any file
   int exitCode;
-  std::string logText;  // expected in the log ("" for none)
-  bool writesResult = false;
-  bool emptyResult = false;  // every node of the result holds the fill value
-  bool notAsRoot = false;    // permissions do not bind root
+  std::string logText;  // expected in the log
   // Expected in a line "karnet: ..." of the standard error stream ("" for none): the file that
   // stopped the run and why. Written also in batch mode, where the log's messages are not.
   std::string stderrText = {};
+  int flags = 0;
 };
 
-// The row, also expecting text in a "karnet: " line of the standard error stream.
-BadInput named(BadInput row, std::string text) {
-  row.stderrText = std::move(text);
-  return row;
+const std::string kSuccess = "Completion code : Successful";
+
+Spoil text(const std::string& name, const std::string& content) {
+  return [=](D d) { writeFile(d.file(name), content); };
+}
+Spoil swapIn(const std::string& name, const std::string& from, const std::string& to) {
+  return [=](D d) { replaceInFile(d.file(name), from, to); };
+}
+Spoil directoryAt(const std::string& name) {
+  return [=](D d) {
+    fs::remove(d.file(name));
+    fs::create_directory(d.file(name));
+  };
+}
+Spoil devZeroAt(const std::string& name) {
+  return [=](D d) {
+    fs::remove(d.file(name));
+    fs::create_symlink("/dev/zero", d.file(name));
+  };
+}
+Spoil fifoAt(const std::string& name) {
+  return [=](D d) { makeFifo(d.file(name)); };
+}
+// CR LF line ends; none after the last line unless lastEnd.
+Spoil crlf(const std::string& name, bool lastEnd = true) {
+  return [=](D d) {
+    const auto lines = splitLines(readFile(d.file(name)));
+    std::string out;
+    for (std::size_t i = 0; i < lines.size(); ++i) {
+      out += lines[i] + (lastEnd || i + 1 < lines.size() ? "\r\n" : "");
+    }
+    writeFile(d.file(name), out);
+  };
+}
+// The observation file with content before its line `at` (counted from 0; -1: at the end).
+Spoil insertObs(int at, const std::string& content) {
+  return [=](D d) {
+    const auto lines = splitLines(readFile(d.file("observations.txt")));
+    std::string out;
+    for (std::size_t i = 0; i < lines.size(); ++i) {
+      if (static_cast<int>(i) == at) out += content;
+      out += lines[i] + "\n";
+    }
+    writeFile(d.file("observations.txt"), at < 0 ? out + content : out);
+  };
 }
 
 // True when a line of err starts with "karnet: " and holds text.
@@ -109,39 +152,46 @@ bool hasNoticeLine(const std::string& err, const std::string& text) {
   return false;
 }
 
-using P = ParameterFile&;
-using D = const TempDir&;
+// The log lines after the echo's closing frame.
+std::vector<std::string> linesAfterEcho(const std::string& log) {
+  const auto lines = splitLines(log);
+  std::size_t frames = 0;
+  for (std::size_t i = 0; i < lines.size(); ++i) {
+    if (lines[i] == std::string(70, '=') && ++frames == 2) {
+      return std::vector<std::string>(lines.begin() + i + 1, lines.end());
+    }
+  }
+  return {};
+}
 
 std::vector<BadInput> parameterFileRows() {
-  auto pfs = [](const std::string& text) {
-    return [text](D d) { writeFile(d.file("case.pfs"), text); };
-  };
-  auto swapInPfs = [](const std::string& from, const std::string& to) {
-    return [from, to](D d) { replaceInFile(d.file("case.pfs"), from, to); };
-  };
   std::string deep;
   for (int i = 0; i < 50; ++i) deep += "[LEVEL" + std::to_string(i) + "]\n";
   for (int i = 0; i < 50; ++i) deep += "EndSect\n";
   std::string binary;
   for (int i = 0; i < 4096; ++i) binary += static_cast<char>((i * 7919 + 13) % 256);
+  const std::string noTarget = "target [Q4_DIGITIZING_OF_DATA] not found";
+  const std::string notRegular = "Can't open case.pfs (not a regular file)";
   return {
-      named({"empty parameter file", {}, pfs(""), 1, "target [Q4_DIGITIZING_OF_DATA] not found"},
-            "case.pfs:1: target [Q4_DIGITIZING_OF_DATA] not found"),
-      named({"binary parameter file", {}, pfs(binary), 1, "Error in parameter file"},
-            "case.pfs:1: NUL byte in the line"),
-      {"sections 50 deep", {}, pfs(deep), 1, "target [Q4_DIGITIZING_OF_DATA] not found"},
+      {"empty parameter file", {}, text("case.pfs", ""), 1, noTarget, "case.pfs:1: " + noTarget},
+      {"binary parameter file", {}, text("case.pfs", binary), 1, "Error in parameter file",
+       "case.pfs:1: NUL byte in the line"},
+      {"sections 50 deep", {}, text("case.pfs", deep), 1, noTarget},
       {"target 50 sections deep", {},
        [](D d) {
          std::string text = readFile(d.file("case.pfs"));
          for (int i = 0; i < 50; ++i) text = "[OUTER" + std::to_string(i) + "]\n" + text + "EndSect\n";
          writeFile(d.file("case.pfs"), text);
        },
-       1, "target [Q4_DIGITIZING_OF_DATA] not found"},
-      {"block never closed", {}, swapInPfs("EndSect  // OUTPUT_DATA", ""), 1,
+       1, noTarget},
+      {"block never closed", {}, swapIn("case.pfs", "EndSect  // OUTPUT_DATA", ""), 1,
        "is not closed (EndSect missing)"},
-      {"EndSect without a block", {}, pfs("EndSect\n"), 1, "EndSect without an open block"},
-      {"keyword outside any block", {}, pfs("Spacing = 2\n"), 1, "outside of any block"},
-      {"NUL byte", {}, swapInPfs("Title", std::string("Ti\0tle", 6)), 1, "NUL byte in the line"},
+      {"EndSect without a block", {}, text("case.pfs", "EndSect\n"), 1,
+       "EndSect without an open block"},
+      {"keyword outside any block", {}, text("case.pfs", "Spacing = 2\n"), 1,
+       "outside of any block"},
+      {"NUL byte", {}, swapIn("case.pfs", "Title", std::string("Ti\0tle", 6)), 1,
+       "NUL byte in the line"},
       {"huge float", [](P p) { p.spacing = "1e39"; }, {}, 1, "not a number within the float range"},
       {"huge double", [](P p) { p.searchRadius = "1e400"; }, {}, 1,
        "not a number within the float range"},
@@ -159,119 +209,118 @@ std::vector<BadInput> parameterFileRows() {
        1, "at most 259 are allowed"},
       {"projection too long", [](P p) { p.projection = "'" + std::string(1100, 'p') + "'"; }, {},
        1, "at most 1023 are allowed"},
-      {"missing keyword", {}, swapInPfs("Spacing = 2.5", ""), 1, "keyword Spacing not found"},
+      {"missing keyword", {}, swapIn("case.pfs", "Spacing = 2.5", ""), 1,
+       "keyword Spacing not found"},
       {"missing section", [](P p) { p.omit = {"OUTPUT_DATA"}; }, {}, 1,
        "section [OUTPUT_DATA] not found"},
-      {"other target name", {}, swapInPfs("[Q4_DIGITIZING_OF_DATA]", "[Q5]"), 1,
-       "target [Q4_DIGITIZING_OF_DATA] not found"},
-      named({"parameter file is a directory", {},
-             [](D d) {
-               fs::remove(d.file("case.pfs"));
-               fs::create_directory(d.file("case.pfs"));
-             },
-             1, "Can't open case.pfs"},
-            "Can't open case.pfs"),
-      named({"keyword with a bad value, named with its line", [](P p) { p.spacing = "abc"; }, {}, 1,
-             "(the word abc) is not a number"},
-            "case.pfs:11: keyword Spacing: parameter 1 (the word abc) is not a number"),
-      {"parameter file is /dev/zero", {},
-       [](D d) {
-         fs::remove(d.file("case.pfs"));
-         fs::create_symlink("/dev/zero", d.file("case.pfs"));
-       },
-       1, "Can't open case.pfs (not a regular file)"},
-      {"parameter file is a FIFO", {}, [](D d) { makeFifo(d.file("case.pfs")); }, 1,
-       "Can't open case.pfs (not a regular file)"},
+      {"other target name", {}, swapIn("case.pfs", "[Q4_DIGITIZING_OF_DATA]", "[Q5]"), 1,
+       noTarget},
+      {"parameter file is a directory", {}, directoryAt("case.pfs"), 1, "Can't open case.pfs"},
+      {"keyword with a bad value, named with its line", [](P p) { p.spacing = "abc"; }, {}, 1,
+       "(the word abc) is not a number",
+       "case.pfs:11: keyword Spacing: parameter 1 (the word abc) is not a number"},
+      {"parameter file is /dev/zero", {}, devZeroAt("case.pfs"), 1, notRegular},
+      {"parameter file is a FIFO", {}, fifoAt("case.pfs"), 1, notRegular},
       {"parameter file larger than 64 MiB", {},
        [](D d) { fs::resize_file(d.file("case.pfs"), (std::uintmax_t{64} << 20) + 1); }, 1,
        "Can't open case.pfs (larger than"},
-      {"CR LF line ends", {},
-       [](D d) {
-         std::string crlf;
-         for (const std::string& line : splitLines(readFile(d.file("case.pfs")))) {
-           crlf += line + "\r\n";
-         }
-         writeFile(d.file("case.pfs"), crlf);
-       },
-       0, "Completion code : Successful", true},
+      {"CR LF line ends", {}, crlf("case.pfs"), 0, kSuccess, "", kResult},
       {"byte order mark", {},
        [](D d) { writeFile(d.file("case.pfs"), "\xEF\xBB\xBF" + readFile(d.file("case.pfs"))); },
-       0, "Completion code : Successful", true},
+       0, kSuccess, "", kResult},
       {"level range beyond memory", [](P p) { p.zRange = "0, 2000000000"; }, {}, 1,
        "ERROR: Unable to allocate memory"},
   };
 }
 
+// Settings that cannot give a sound run are refused before any computing.
+std::vector<BadInput> settingRows() {
+  const std::string calculation = "ERROR: in calculation parameters";
+  return {
+      {"reversed level range", [](P p) { p.zRange = "9, 3"; }, {}, 1, "l0 = 9 lx = 3", "", kAtEcho},
+      {"zero level spacing", [](P p) { p.spacing = "0"; }, {}, 1, "dz = 0.000000", "", kAtEcho},
+      {"negative level spacing", [](P p) { p.spacing = "-2"; }, {}, 1, "dz = -2.000000", "",
+       kAtEcho},
+      {"negative search radius", [](P p) { p.searchRadius = "-1"; }, {}, 1, calculation, "",
+       kAtEcho},
+      {"negative extrapolation", [](P p) { p.maxExtrapolationDistance = "1, -1"; }, {}, 1,
+       calculation, "", kAtEcho},
+      {"error variance above 100", [](P p) { p.errorVariance = "100.5"; }, {}, 1, calculation, "",
+       kAtEcho},
+      {"no correlation samples", [](P p) { p.correlationSampleSize = "0"; }, {}, 1, calculation,
+       "", kAtEcho},
+      {"zero decay with objective analysis",
+       [](P p) {
+         p.analysis = "objective";
+         p.decayDistance = "0";
+       },
+       {}, 1, calculation, "", kAtEcho},
+      {"zero crossing with objective analysis",
+       [](P p) {
+         p.analysis = "objective";
+         p.zeroCrossingDistance = "0";
+       },
+       {}, 1, calculation, "", kAtEcho},
+      {"zero decay and crossing with bilinear analysis",
+       [](P p) { p.decayDistance = p.zeroCrossingDistance = "0"; }, {}, 0, kSuccess, "", kResult},
+      {"garbage projection", [](P p) { p.projection = "'+proj=nonsense +zone=99'"; }, {}, 1,
+       "Unable to initialize geo. system", "", kAtEcho},
+  };
+}
+
 std::vector<BadInput> observationRows() {
-  auto obs = [](const std::string& text) {
-    return [text](D d) { writeFile(d.file("observations.txt"), text); };
-  };
-  auto appendObs = [](const std::string& text) {
-    return [text](D d) { writeFile(d.file("observations.txt"), readFile(d.file("observations.txt")) + text); };
-  };
-  auto prependObs = [](const std::string& text) {
-    return [text](D d) { writeFile(d.file("observations.txt"), text + readFile(d.file("observations.txt"))); };
-  };
   const std::string waterError = "\nERROR while reading water file\n      line number: ";
   return {
-      {"NUL byte inside a line", {}, prependObs(std::string("1500 2500 -2\0 4\n", 16)), 1,
+      {"NUL byte inside a line", {}, insertObs(0, std::string("1500 2500 -2\0 4\n", 16)), 1,
        waterError + "1\n"},
       // The bytes after a NUL must not join the next line into a false observation.
-      {"NUL byte hides a line end", {},
-       prependObs(std::string("1500 2500\0 junk\n-2 4\n", 21)), 1, waterError + "1\n"},
-      {"1 MB line of text", {}, prependObs(std::string(1 << 20, 'x') + "\n"), 1,
+      {"NUL byte hides a line end", {}, insertObs(0, std::string("1500 2500\0 junk\n-2 4\n", 21)),
+       1, waterError + "1\n"},
+      {"1 MB line of text", {}, insertObs(0, std::string(1 << 20, 'x') + "\n"), 1,
        waterError + "1\n"},
       {"1 MB of trailing text", {},
-       prependObs("1500 2500 -2 4 " + std::string(1 << 20, 'x') + "\n"), 0,
-       "Completion code : Successful", true},
-      {"inf", {}, prependObs("1500 inf -2 4\n"), 1, waterError + "1\n"},
-      {"-infinity", {}, prependObs("1500 2500 -infinity 4\n"), 1, waterError + "1\n"},
-      {"nan", {}, appendObs("1500 2500 -2 nan\n"), 1, waterError},
-      {"number beyond double", {}, prependObs("1e999 2500 -2 4\n"), 1, waterError + "1\n"},
-      {"1e308", {}, appendObs("1e308 2500 -2 4\n"), 1, "\nERROR: basic grid too large\n"},
-      {"-1e308 depth", {}, appendObs("1500 2500 -1e308 4\n"), 1,
+       insertObs(0, "1500 2500 -2 4 " + std::string(1 << 20, 'x') + "\n"), 0, kSuccess, "",
+       kResult},
+      {"inf", {}, insertObs(0, "1500 inf -2 4\n"), 1, waterError + "1\n",
+       "observations.txt:1: not a finite number: \"inf\""},
+      {"-infinity", {}, insertObs(0, "1500 2500 -infinity 4\n"), 1, waterError + "1\n"},
+      {"nan", {}, insertObs(6, "1500 3000 -2 nan\n"), 1, waterError + "7\n"},
+      {"number beyond double", {}, insertObs(0, "1e999 2500 -2 4\n"), 1, waterError + "1\n"},
+      {"1e308", {}, insertObs(-1, "1e308 2500 -2 4\n"), 1, "\nERROR: basic grid too large\n"},
+      {"-1e308 depth", {}, insertObs(-1, "1500 2500 -1e308 4\n"), 1,
        "\nERROR: basic grid too large\n"},
-      {"three numbers", {}, prependObs("1500 2500 -2\n"), 1, waterError + "1\n"},
-      {"blank line", {}, prependObs("\n"), 1, waterError + "1\n"},
-      {"header line", {}, prependObs("x y z temperature\n"), 1, waterError + "1\n"},
-      {"binary observation file", {}, obs(std::string("\x7f" "ELF\x02\x01\x01\0\0\0", 10)), 1,
+      {"three numbers", {}, insertObs(6, "1500 3000 -2\n"), 1, waterError + "7\n",
+       "observations.txt:7: 4 numbers expected (x y z value), found 3"},
+      {"blank line", {}, insertObs(6, "\n"), 1, waterError + "7\n", "observations.txt:7: empty line"},
+      {"header line", {}, insertObs(0, "x y z temperature\n"), 1, waterError + "1\n",
+       "observations.txt:1: not a number: \"x\""},
+      {"binary observation file", {},
+       text("observations.txt", std::string("\x7f" "ELF\x02\x01\x01\0\0\0", 10)), 1,
        waterError + "1\n"},
-      {"empty observation file", {}, obs(""), 0, "Completion code : Successful", true},
-      {"all observations far outside", {},
-       obs("5e6 5e6 -2 4\n5e6 5e6 -4 3\n"), 1, "\nERROR: basic grid too large\n"},
+      {"empty observation file", {}, text("observations.txt", ""), 0, kSuccess, "", kResult},
+      {"all observations far outside", {}, text("observations.txt", "5e6 5e6 -2 4\n5e6 5e6 -4 3\n"),
+       1, "\nERROR: basic grid too large\n"},
       {"all observations beside the grid", {},
-       obs("20000 3000 -2 4\n20000 3000 -4 3\n"), 0, "No. of no interpolations", true},
+       text("observations.txt", "20000 3000 -2 4\n20000 3000 -4 3\n"), 0,
+       "No. of no interpolations", "", kResult},
       {"all observations on land", {},
-       obs("8000 7500 -2 4\n8000 7500 -4 3\n"), 0, "No. of no interpolations", true},
-      {"CR LF observation file", {},
+       text("observations.txt", "8000 7500 -2 4\n8000 7500 -4 3\n"), 0,
+       "No. of no interpolations", "", kResult},
+      // Trailing text is ignored however long the line; the last line needs no line end.
+      {"CR LF, a long line and no final line end", {},
        [](D d) {
-         std::string crlf;
-         for (const std::string& line : splitLines(readFile(d.file("observations.txt")))) {
-           crlf += line + "\r\n";
-         }
-         writeFile(d.file("observations.txt"), crlf);
+         insertObs(3, "3000 3500 -2 7   " + std::string(200, '#') + "\n")(d);
+         crlf("observations.txt", false)(d);
        },
-       0, "Completion code : Successful", true},
-      named({"observation file missing", {}, [](D d) { fs::remove(d.file("observations.txt")); },
-             1, "ERROR: in input file selection"},
-            "observations.txt: No such file or directory"),
-      named({"observation file is a directory", {},
-             [](D d) {
-               fs::remove(d.file("observations.txt"));
-               fs::create_directory(d.file("observations.txt"));
-             },
-             1, "ERROR: in input file selection"},
-            "observations.txt: is a directory, not a regular file"),
-      named({"observation file is a FIFO", {}, [](D d) { makeFifo(d.file("observations.txt")); },
-             1, "ERROR: in input file selection"},
-            "observations.txt: not a regular file"),
-      named({"observation file is /dev/zero", {},
-             [](D d) {
-               fs::remove(d.file("observations.txt"));
-               fs::create_symlink("/dev/zero", d.file("observations.txt"));
-             },
-             1, "ERROR: in input file selection"},
-            "observations.txt: not a regular file"),
+       0, kSuccess, "", kResult},
+      {"observation file missing", {}, [](D d) { fs::remove(d.file("observations.txt")); }, 1,
+       "ERROR: in input file selection", "observations.txt: No such file or directory", kAtEcho},
+      {"observation file is a directory", {}, directoryAt("observations.txt"), 1,
+       "ERROR: in input file selection", "observations.txt: is a directory, not a regular file"},
+      {"observation file is a FIFO", {}, fifoAt("observations.txt"), 1,
+       "ERROR: in input file selection", "observations.txt: not a regular file"},
+      {"observation file is /dev/zero", {}, devZeroAt("observations.txt"), 1,
+       "ERROR: in input file selection", "observations.txt: not a regular file"},
   };
 }
 
@@ -280,153 +329,124 @@ std::vector<BadInput> bathymetryRows() {
     return [cdl, kind](D d) { ncgen(d.file("bathymetry.nc"), cdl, kind); };
   };
   const std::string unread = "dx = -0.000000 dy = -0.000000";
+  const std::string cantRead = "bathymetry.nc: cannot be read as NetCDF: ";
+  const std::string tooShort = "bathymetry.nc: its NetCDF header declares more than the file holds";
+  const std::string no2d = "bathymetry.nc: no usable 2-D item";
   const std::string item2d = "  float bathymetry(y, x) ; bathymetry:grid_mapping = \"crs\" ;\n";
+  const std::string dims = "  y = 3 ;\n  x = 4 ;\n";
+  const std::string heights = "-5, -10, -12, -9, -7, -20, -25, -4, -3, -8, -6, -2";
   return {
-      named({"truncated bathymetry", {},
-             [](D d) {
-               const std::string bytes = readFile(d.file("bathymetry.nc"));
-               writeFile(d.file("bathymetry.nc"), bytes.substr(0, bytes.size() / 2));
-             },
-             1, unread},
-            "bathymetry.nc: cannot be read as NetCDF: "),
+      {"truncated bathymetry", {},
+       [](D d) {
+         const std::string bytes = readFile(d.file("bathymetry.nc"));
+         writeFile(d.file("bathymetry.nc"), bytes.substr(0, bytes.size() / 2));
+       },
+       1, unread, cantRead},
       // A 613-byte classic file whose header declares an attribute of 6.7 GB.
-      named({"bathymetry declaring gigabytes", {},
-             [](D d) {
-               fs::copy_file(std::string(KARNET_SOURCE_DIR) +
-                                 "/tests/fuzz/regressions/bathymetry_huge_attribute.nc",
-                             d.file("bathymetry.nc"), fs::copy_options::overwrite_existing);
-             },
-             1, unread},
-            "bathymetry.nc: its NetCDF header declares more than the file holds"),
+      {"bathymetry declaring gigabytes", {},
+       [](D d) {
+         fs::copy_file(std::string(KARNET_SOURCE_DIR) +
+                           "/tests/fuzz/regressions/bathymetry_huge_attribute.nc",
+                       d.file("bathymetry.nc"), fs::copy_options::overwrite_existing);
+       },
+       1, unread, tooShort},
       // The header is whole, the last heights are missing: they must not read as zeros.
-      named({"classic bathymetry cut in its values", {},
-             [](D d) {
-               ncgen(d.file("bathymetry.nc"),
-                     typedBathymetry("float", "-5, -10, -12, -9, -7, -20, -25, -4, -3, -8, -6, -2"),
-                     "classic");
-               const std::string bytes = readFile(d.file("bathymetry.nc"));
-               writeFile(d.file("bathymetry.nc"), bytes.substr(0, bytes.size() - 8));
-             },
-             1, unread},
-            "bathymetry.nc: its NetCDF header declares more than the file holds"),
-      named({"text as bathymetry", {},
-             [](D d) { writeFile(d.file("bathymetry.nc"), "CDF\x01 garbage"); }, 1, unread},
-            "bathymetry.nc: its NetCDF header declares more than the file holds"),
-      named({"empty bathymetry file", {}, [](D d) { writeFile(d.file("bathymetry.nc"), ""); }, 1,
-             unread},
-            "bathymetry.nc: cannot be read as NetCDF: "),
-      named({"HDF5 file without variables", {}, nc("netcdf e {\ndimensions:\n  x = 4 ;\n}\n"), 1,
-             unread},
-            "bathymetry.nc: no 2-D item"),
-      named({"1-D item", {},
-             nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n",
-                              "  float bathymetry(x) ; bathymetry:grid_mapping = \"crs\" ;\n")),
-             1, unread},
-            "bathymetry.nc: no usable 2-D item"),
-      named({"3-D item", {},
-             nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n  z = 2 ;\n",
-                              "  float bathymetry(z, y, x) ; bathymetry:grid_mapping = \"crs\" ;\n")),
-             1, unread},
-            "bathymetry.nc: no usable 2-D item"),
-      named({"zero-size dimension", {},
-             nc(bathymetryCdl("  y = 3 ;\n  x = UNLIMITED ;\n", item2d)), 1, unread},
-            "bathymetry.nc: no usable 2-D item"),
-      named({"huge declared dimensions", {},
-             nc(bathymetryCdl("  y = 50000 ;\n  x = 50000 ;\n",
-                              "  float bathymetry(y, x) ; bathymetry:grid_mapping = \"crs\" ;\n"
-                              "    bathymetry:_Storage = \"chunked\" ; bathymetry:_ChunkSizes = 500, 500 ;\n")),
-             1, unread},
-            "bathymetry.nc: no usable 2-D item"),
-      named({"NaN spacing", {},
-             nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n", item2d, "  x:spacing = NaN ;\n")), 1,
-             unread},
-            "bathymetry.nc: no usable 2-D item"),
-      named({"negative spacing", {},
-             nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n", item2d, "  y:spacing = -250. ;\n")), 1,
-             unread},
-            "bathymetry.nc: no usable 2-D item"),
-      named({"uneven coordinates", {},
-             nc("netcdf b {\ndimensions:\n  y = 3 ;\n  x = 4 ;\nvariables:\n  double x(x) ;\n"
-                "  double y(y) ;\n  float bathymetry(y, x) ;\n  int crs ; crs:projection = \"LOCAL\" ;\n"
-                "  crs:origin_longitude = 1000. ; crs:origin_latitude = 2000. ; crs:orientation = 0. ;\n"
-                "data:\n x = 0, 250, 600, 750 ;\n y = 0, 250, 500 ;\n}\n"),
-             1, unread},
-            "bathymetry.nc: no usable 2-D item"),
-      named({"char values", {},
-             nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n",
-                              "  char bathymetry(y, x) ; bathymetry:grid_mapping = \"crs\" ;\n")),
-             1, unread},
-            "bathymetry.nc: no usable 2-D item"),
-      named({"unusable packing", {},
-             nc(bathymetryCdl("  y = 3 ;\n  x = 4 ;\n",
-                              "  short bathymetry(y, x) ; bathymetry:scale_factor = \"big\" ;\n")),
-             1, unread},
-            "bathymetry.nc: no usable 2-D item"),
-      named({"no crs variable", {},
-             nc("netcdf b {\ndimensions:\n  y = 3 ;\n  x = 4 ;\nvariables:\n  float bathymetry(y, x) ;\n"
-                "  double x(x) ; x:spacing = 250. ;\n  double y(y) ; y:spacing = 250. ;\n}\n"),
-             1, "\nERROR while reading bathymetry file\n"},
-            "bathymetry.nc: no crs variable with projection"),
-      {"int64 values", {}, nc(typedBathymetry("int64", "-5, -10, -12, -9, -7, -20, -25, -4, -3, -8, -6, -2")),
-       0, "Completion code : Successful", true},
-      {"classic format", {},
-       nc(typedBathymetry("float", "-5, -10, -12, -9, -7, -20, -25, -4, -3, -8, -6, -2"), "classic"),
-       0, "Completion code : Successful", true},
-      {"garbage projection", [](P p) { p.projection = "'+proj=nonsense +zone=99'"; }, {}, 1,
-       "Unable to initialize geo. system"},
+      {"classic bathymetry cut in its values", {},
+       [heights](D d) {
+         ncgen(d.file("bathymetry.nc"), typedBathymetry("float", heights), "classic");
+         const std::string bytes = readFile(d.file("bathymetry.nc"));
+         writeFile(d.file("bathymetry.nc"), bytes.substr(0, bytes.size() - 8));
+       },
+       1, unread, tooShort},
+      {"text as bathymetry", {}, text("bathymetry.nc", "CDF\x01 garbage"), 1, unread, tooShort,
+       kAtEcho},
+      {"plain text as bathymetry", {}, text("bathymetry.nc", "not a grid\n"), 1, unread, "",
+       kAtEcho},
+      {"empty bathymetry file", {}, text("bathymetry.nc", ""), 1, unread, cantRead},
+      {"HDF5 file without variables", {}, nc("netcdf e {\ndimensions:\n  x = 4 ;\n}\n"), 1,
+       unread, "bathymetry.nc: no 2-D item"},
+      {"1-D item", {},
+       nc(bathymetryCdl(dims, "  float bathymetry(x) ; bathymetry:grid_mapping = \"crs\" ;\n")), 1,
+       unread, no2d},
+      {"3-D item", {},
+       nc(bathymetryCdl(dims + "  z = 2 ;\n",
+                        "  float bathymetry(z, y, x) ; bathymetry:grid_mapping = \"crs\" ;\n")),
+       1, unread, no2d},
+      {"zero-size dimension", {}, nc(bathymetryCdl("  y = 3 ;\n  x = UNLIMITED ;\n", item2d)), 1,
+       unread, no2d},
+      {"huge declared dimensions", {},
+       nc(bathymetryCdl("  y = 50000 ;\n  x = 50000 ;\n",
+                        item2d + "    bathymetry:_Storage = \"chunked\" ;"
+                                 " bathymetry:_ChunkSizes = 500, 500 ;\n")),
+       1, unread, no2d},
+      {"NaN spacing", {}, nc(bathymetryCdl(dims, item2d, "  x:spacing = NaN ;\n")), 1, unread,
+       no2d},
+      {"negative spacing", {}, nc(bathymetryCdl(dims, item2d, "  y:spacing = -250. ;\n")), 1,
+       unread, no2d},
+      {"uneven coordinates", {},
+       nc("netcdf b {\ndimensions:\n  y = 3 ;\n  x = 4 ;\nvariables:\n  double x(x) ;\n"
+          "  double y(y) ;\n  float bathymetry(y, x) ;\n  int crs ; crs:projection = \"LOCAL\" ;\n"
+          "  crs:origin_longitude = 1000. ; crs:origin_latitude = 2000. ; crs:orientation = 0. ;\n"
+          "data:\n x = 0, 250, 600, 750 ;\n y = 0, 250, 500 ;\n}\n"),
+       1, unread, no2d},
+      {"char values", {},
+       nc(bathymetryCdl(dims, "  char bathymetry(y, x) ; bathymetry:grid_mapping = \"crs\" ;\n")),
+       1, unread, no2d},
+      {"unusable packing", {},
+       nc(bathymetryCdl(dims, "  short bathymetry(y, x) ; bathymetry:scale_factor = \"big\" ;\n")),
+       1, unread, no2d},
+      {"no crs variable", {},
+       nc("netcdf b {\ndimensions:\n  y = 3 ;\n  x = 4 ;\nvariables:\n  float bathymetry(y, x) ;\n"
+          "  double x(x) ; x:spacing = 250. ;\n  double y(y) ; y:spacing = 250. ;\n}\n"),
+       1, "\nERROR while reading bathymetry file\n", "bathymetry.nc: no crs variable with projection"},
+      // A single node: neither axis has a spacing.
+      {"one node", {},
+       [](D d) { writeBathymetry(d.file("bathymetry.nc"), localBasin(1, 1, 0.0, -10.0f)); },
+       1, "dx = 0.000000 dy = 0.000000", "", kAtEcho},
+      {"int64 values", {}, nc(typedBathymetry("int64", heights)), 0, kSuccess, "", kResult},
+      {"classic format", {}, nc(typedBathymetry("float", heights), "classic"), 0, kSuccess, "",
+       kResult},
       // The run takes its projection from the parameter file; the bathymetry's text is not used.
       {"garbage projection in the bathymetry", {},
        [](D d) {
-         BathymetrySpec b;
-         b.nx = 4;
-         b.ny = 3;
+         BathymetrySpec b = localBasin(4, 3, 250.0, -10.0f);
          b.projection = "+proj=nonsense +zone=99";
-         b.heights.assign(12, -10.0f);
          writeBathymetry(d.file("bathymetry.nc"), b);
        },
-       0, "Completion code : Successful", true},
+       0, kSuccess, "", kResult},
       // No wet node: the run completes with a result that holds no estimate.
       {"all land", {}, [](D d) { uniformBathymetry(d, 10.0f); }, 0,
-       "No. of bilinear interpolations          : 0", true, true},
+       "No. of bilinear interpolations          : 0", "", kResult | kEmpty},
       {"all NaN", {}, [](D d) { uniformBathymetry(d, std::nanf("")); }, 0,
-       "No. of bilinear interpolations          : 0", true, true},
-      named({"bathymetry is a FIFO", {}, [](D d) { makeFifo(d.file("bathymetry.nc")); }, 1,
-             "ERROR: in input file selection"},
-            "bathymetry.nc: not a regular file"),
-      named({"bathymetry is a directory", {},
-             [](D d) {
-               fs::remove(d.file("bathymetry.nc"));
-               fs::create_directory(d.file("bathymetry.nc"));
-             },
-             1, "ERROR: in input file selection"},
-            "bathymetry.nc: is a directory, not a regular file"),
+       "No. of bilinear interpolations          : 0", "", kResult | kEmpty},
+      {"bathymetry missing", [](P p) { p.fileName = "|nowhere.nc|"; }, {}, 1,
+       "ERROR: in input file selection", "", kAtEcho},
+      {"bathymetry is a FIFO", {}, fifoAt("bathymetry.nc"), 1, "ERROR: in input file selection",
+       "bathymetry.nc: not a regular file"},
+      {"bathymetry is a directory", {}, directoryAt("bathymetry.nc"), 1,
+       "ERROR: in input file selection", "bathymetry.nc: is a directory, not a regular file"},
   };
 }
 
 std::vector<BadInput> outputRows() {
   const std::string ownFile = "is one of the run's own files";
+  const std::string writeError = "ERROR while writing result file";
   return {
-      named({"output directory missing", [](P p) { p.outputFileName = "|nowhere/result.nc|"; },
-             {}, 1, "ERROR while writing result file"},
-            "nowhere/result.nc: No such file or directory"),
-      named({"read-only output directory", [](P p) { p.outputFileName = "|locked/result.nc|"; },
-             [](D d) {
-               fs::create_directory(d.file("locked"));
-               writeFile(d.file("locked/result.nc"), kEarlierResult);
-               fs::permissions(d.file("locked"), fs::perms::owner_read | fs::perms::owner_exec);
-             },
-             1, "ERROR while writing result file", false, false, true},
-            "locked/result.nc: Permission denied"),
-      named({"output path is a directory", [](P p) { p.outputFileName = "|out|"; },
-             [](D d) { fs::create_directory(d.file("out")); }, 1,
-             "ERROR while writing result file"},
-            "out: is a directory"),
-      named({"output path ends in a slash", [](P p) { p.outputFileName = "|out/|"; }, {}, 1,
-             "ERROR while writing result file"},
-            "out/: the name ends in '/' (a directory)"),
-      named({"output under a file", [](P p) { p.outputFileName = "|observations.txt/result.nc|"; },
-             {}, 1, "ERROR while writing result file"},
-            "observations.txt/result.nc: observations.txt is not a directory"),
+      {"output directory missing", [](P p) { p.outputFileName = "|nowhere/result.nc|"; }, {}, 1,
+       writeError, "nowhere/result.nc: No such file or directory"},
+      {"read-only output directory", [](P p) { p.outputFileName = "|locked/result.nc|"; },
+       [](D d) {
+         fs::create_directory(d.file("locked"));
+         writeFile(d.file("locked/result.nc"), kEarlierResult);
+         fs::permissions(d.file("locked"), fs::perms::owner_read | fs::perms::owner_exec);
+       },
+       1, writeError, "locked/result.nc: Permission denied", kNotAsRoot},
+      {"output path is a directory", [](P p) { p.outputFileName = "|out|"; },
+       [](D d) { fs::create_directory(d.file("out")); }, 1, writeError, "out: is a directory"},
+      {"output path ends in a slash", [](P p) { p.outputFileName = "|out/|"; }, {}, 1, writeError,
+       "out/: the name ends in '/' (a directory)"},
+      {"output under a file", [](P p) { p.outputFileName = "|observations.txt/result.nc|"; }, {},
+       1, writeError, "observations.txt/result.nc: observations.txt is not a directory"},
       {"output is the bathymetry", [](P p) { p.outputFileName = "|bathymetry.nc|"; }, {}, 1,
        ownFile},
       {"output is the observation file", [](P p) { p.outputFileName = "|observations.txt|"; }, {},
@@ -434,7 +454,7 @@ std::vector<BadInput> outputRows() {
       {"output is the parameter file", [](P p) { p.outputFileName = "|case.pfs|"; }, {}, 1,
        ownFile},
       {"output is the log", [](P p) { p.outputFileName = "|case.log|"; },
-       [](D d) { writeFile(d.file("case.log"), "an old log\n"); }, 1, ownFile},
+       text("case.log", "an old log\n"), 1, ownFile},
       {"output is the bathymetry by another name",
        [](P p) { p.outputFileName = "|./sub/../bathymetry.nc|"; },
        [](D d) { fs::create_directory(d.file("sub")); }, 1, ownFile},
@@ -457,10 +477,10 @@ std::map<std::string, std::string> snapshot(const TempDir& dir) {
 
 void runRow(const BadInput& row) {
   SCOPED_TRACE(row.name);
-  if (row.notAsRoot && geteuid() == 0) return;
+  if ((row.flags & kNotAsRoot) != 0 && geteuid() == 0) return;
+  const bool writesResult = (row.flags & kResult) != 0;
   TempDir dir;
   ParameterFile p;
-  p.projection = "'LOCAL'";
   if (row.edit) row.edit(p);
   writeSmallCase(dir, p);
   writeFile(dir.file("result.nc"), kEarlierResult);
@@ -468,12 +488,16 @@ void runRow(const BadInput& row) {
   const auto before = snapshot(dir);
 
   const ProcessResult r =
-      runProgram(KARNET_BINARY, {"case.pfs"}, dir.path(), {{"buildmode", "nigth"}}, {}, 30);
+      runProgram(KARNET_BINARY, {"case.pfs"}, dir.path(), kBatch, {}, 30);
   const std::string log = readFile(dir.file("case.log"));
   EXPECT_EQ(r.termSignal, 0) << "killed: a crash or a hang";
   EXPECT_EQ(r.exitCode, row.exitCode) << log;
-  EXPECT_NE(log.find(row.logText), std::string::npos) << "log lacks: " << row.logText << "\n"
-                                                       << log;
+  EXPECT_TRUE(contains(log, row.logText)) << "log lacks: " << row.logText << "\n" << log;
+  if ((row.flags & kAtEcho) != 0) {
+    const auto after = linesAfterEcho(log);
+    ASSERT_FALSE(after.empty()) << log;
+    EXPECT_EQ(after[0], row.logText);
+  }
   if (!row.stderrText.empty()) {
     EXPECT_TRUE(hasNoticeLine(r.err, row.stderrText))
         << "no line \"karnet: ...\" with: " << row.stderrText << "\n" << r.err;
@@ -485,7 +509,7 @@ void runRow(const BadInput& row) {
 
   const auto after = snapshot(dir);
   for (const auto& [name, content] : before) {
-    if (name == "case.log" || (row.writesResult && name == "result.nc")) continue;
+    if (name == "case.log" || (writesResult && name == "result.nc")) continue;
     const auto found = after.find(name);
     ASSERT_NE(found, after.end()) << name << " was removed";
     EXPECT_TRUE(found->second == content) << name << " was changed";
@@ -494,13 +518,13 @@ void runRow(const BadInput& row) {
     if (name == "case.log" || before.count(name) != 0) continue;
     ADD_FAILURE() << "new file " << name;
   }
-  if (row.writesResult) {
+  if (writesResult) {
     int shape[3] = {0, 0, 0};
     const std::vector<float> values = readResult(dir.file("result.nc"), nullptr, shape);
     EXPECT_EQ(shape[0], 12);
     EXPECT_EQ(values.size(), static_cast<std::size_t>(shape[0]) * shape[1] * shape[2]);
     EXPECT_FALSE(values.empty());
-    if (row.emptyResult) {
+    if ((row.flags & kEmpty) != 0) {
       for (float v : values) ASSERT_EQ(v, -1e-30f);
     }
   }
@@ -520,6 +544,10 @@ TEST(BadInput, ParameterFiles) {
 
 TEST(BadInput, ObservationFiles) {
   for (const BadInput& row : observationRows()) runRow(row);
+}
+
+TEST(BadInput, Settings) {
+  for (const BadInput& row : settingRows()) runRow(row);
 }
 
 TEST(BadInput, BathymetryFiles) {

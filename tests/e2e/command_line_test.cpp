@@ -1,4 +1,5 @@
-// The program's command line, log placement and parameter-file failures, run as a user would.
+// The program's command line, log placement, parameter-file failures and the summary it leaves
+// on stderr, run as a user would.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -17,61 +18,37 @@ std::string runTimeBlock(const char* completion) {
          "\n--\n---------------------------------------------------\n";
 }
 
-// The echo may give file names as written or resolved against the run directory.
-std::string withFileNamesResolved(const std::string& line, const std::string& runDir) {
-  for (const std::string key : {"\t\tFileName : ", "\t\tDataFileName : "}) {
-    if (line.rfind(key, 0) == 0) {
-      std::filesystem::path name = line.substr(key.size());
-      if (name.is_relative()) name = std::filesystem::path(runDir) / name;
-      return key + name.lexically_normal().string();
-    }
-  }
-  return line;
-}
-
 TEST(CommandLine, UsageWhenThereIsNoParameterFile) {
   TempDir dir;
   for (const auto& args : std::vector<std::vector<std::string>>{
            {}, {"case.pfs", "//apv"}, {"case.pfs", "//APV"}, {"case.pfs", "-debug"}}) {
     const ProcessResult r = runKarnet(args, dir.path());
     EXPECT_EQ(r.exitCode, 1);
-    EXPECT_NE(r.err.find(kUsage), std::string::npos) << r.err;
+    EXPECT_TRUE(contains(r.err, kUsage)) << r.err;
     // Nothing was named as parameter file, so no log may appear.
     EXPECT_TRUE(listDir(dir.path()).empty());
   }
 }
 
-TEST(CommandLine, BuildmodeNigthSilencesTheMessageOnly) {
-  TempDir dir;
-  ProcessResult shown = runKarnet({"missing.pfs"}, dir.path());
-  const std::string shownLog = readFile(dir.file("missing.log"));
-  ProcessResult quiet = runKarnet({"missing.pfs"}, dir.path(), {{"buildmode", "NiGtH"}});
-  const std::string quietLog = readFile(dir.file("missing.log"));
-  EXPECT_EQ(shown.exitCode, 1);
-  EXPECT_EQ(quiet.exitCode, 1);
-  EXPECT_NE(shown.err.find("karnet: Error in parameter file"), std::string::npos) << shown.err;
-  EXPECT_EQ(quiet.err.find("Error in parameter file"), std::string::npos) << quiet.err;
-  EXPECT_EQ(shownLog, quietLog);
-}
-
+// The log lies beside the parameter file, also one that is missing; batch mode silences
+// only the message.
 TEST(CommandLine, MissingParameterFileIsLoggedBesideIt) {
   TempDir dir;
-  const ProcessResult r = runKarnet({"-debug", "missing.pfs"}, dir.path(),
-                                    {{"buildmode", "nigth"}});
-  EXPECT_EQ(r.exitCode, 1);
-  const std::string log = readFile(dir.file("missing.log"));
-  const auto lines = splitLines(log);
-  ASSERT_GE(lines.size(), 2u) << log;
-  EXPECT_NE(lines[0].find("Can't open"), std::string::npos) << log;
+  const CaseRun shown = runCase(dir, {"-debug", "missing.pfs"}, {});
+  const CaseRun quiet = runCase(dir, {"missing.pfs"}, {{"buildmode", "NiGtH"}});
+  EXPECT_EQ(shown.exitCode, 1);
+  EXPECT_EQ(quiet.exitCode, 1);
+  EXPECT_TRUE(contains(shown.err, "karnet: Error in parameter file")) << shown.err;
+  EXPECT_FALSE(contains(quiet.err, "Error in parameter file")) << quiet.err;
+  EXPECT_EQ(shown.log, quiet.log);
+  const auto lines = splitLines(quiet.log);
+  ASSERT_GE(lines.size(), 2u) << quiet.log;
+  EXPECT_TRUE(contains(lines[0], "Can't open")) << quiet.log;
   EXPECT_EQ(lines[1], "Error in parameter file");
-  EXPECT_EQ(log.substr(log.size() - runTimeBlock("Abnormal").size()), runTimeBlock("Abnormal"));
-}
-
-TEST(CommandLine, TheLastArgumentIsTheParameterFile) {
-  TempDir dir;
-  const ProcessResult r = runKarnet({"first.pfs", "second.pfs"}, dir.path(),
-                                    {{"buildmode", "nigth"}});
-  EXPECT_EQ(r.exitCode, 1);
+  EXPECT_EQ(quiet.log.substr(quiet.log.size() - runTimeBlock("Abnormal").size()),
+            runTimeBlock("Abnormal"));
+  // The last argument is the parameter file.
+  EXPECT_EQ(runCase(dir, {"first.pfs", "second.pfs"}).exitCode, 1);
   EXPECT_TRUE(fileExists(dir.file("second.log")));
   EXPECT_FALSE(fileExists(dir.file("first.log")));
 }
@@ -80,65 +57,86 @@ TEST(CommandLine, UnwritableLogGoesToStandardError) {
   TempDir dir;
   // A directory with the log's name cannot be opened as the log file.
   std::filesystem::create_directory(dir.file("case.log"));
-  const ProcessResult r = runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}});
+  const ProcessResult r = runKarnet({"case.pfs"}, dir.path(), kBatch);
   EXPECT_EQ(r.exitCode, 1);
-  EXPECT_NE(r.err.find("Error in parameter file\n"), std::string::npos) << r.err;
-  EXPECT_NE(r.err.find("-- Completion code : Abnormal"), std::string::npos) << r.err;
+  EXPECT_TRUE(contains(r.err, "Error in parameter file\n")) << r.err;
+  EXPECT_TRUE(contains(r.err, "-- Completion code : Abnormal")) << r.err;
 }
 
 TEST(CommandLine, HelpAndVersionNeedNoParameterFile) {
   TempDir dir;
   const ProcessResult help = runKarnet({"--help"}, dir.path());
   EXPECT_EQ(help.exitCode, 0);
-  EXPECT_NE(help.out.find(kUsage), std::string::npos) << help.out;
-  EXPECT_NE(help.out.find("OUTPUT_DATA"), std::string::npos) << help.out;
+  for (const char* text : {kUsage.c_str(), "OUTPUT_DATA", "--quiet"}) {
+    EXPECT_TRUE(contains(help.out, text)) << text << "\n" << help.out;
+  }
   const ProcessResult version = runKarnet({"--version"}, dir.path());
   EXPECT_EQ(version.exitCode, 0);
-  EXPECT_NE(version.out.find("karnet"), std::string::npos) << version.out;
+  EXPECT_TRUE(contains(version.out, "karnet")) << version.out;
   EXPECT_TRUE(listDir(dir.path()).empty());
 }
 
-TEST(ParameterFile, MissingSectionLeavesTheEchoOfTheSectionsBefore) {
-  TempDir dir;
+// A 10 x 10 node basin of 100 m cells, 50 m deep, with land (the land value) in its two
+// western columns; ten 5 m levels. Observations: three in the water, one on land, one below
+// the bed, two outside the grid on either side.
+void writeSummaryCase(const TempDir& dir) {
+  BathymetrySpec b = localBasin(10, 10, 100.0, -50.0f, 0.0, 0.0);
+  for (int j = 0; j < 10; ++j) b.heights[j * 10] = b.heights[j * 10 + 1] = 10.0f;
+  writeBathymetry(dir.file("bathymetry.nc"), b);
+  writeFile(dir.file("observations.txt"),
+            "500 500 -10 5\n500 500 -20 4\n620 580 -30 3\n0 500 -5 6\n600 600 -60 2\n"
+            "5000 500 -10 1\n-300 500 -10 1\n");
   ParameterFile p;
-  p.omit = {"OUTPUT_DATA"};
+  p.zRange = "0, 9";
+  p.spacing = "5";
+  p.searchRadius = "1000";
   writeFile(dir.file("case.pfs"), p.render());
-  const ProcessResult r = runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}});
-  EXPECT_EQ(r.exitCode, 1);
-  const std::string log = readFile(dir.file("case.log"));
-  const std::vector<std::string> echo = {
-      "======================================================================",
-      "TARGET: Q4_DIGITIZING_OF_DATA",
-      "\tsection: INPUT_FILES ---------------------------------",
-      "\t\tFileName : bathymetry.nc",
-      "\t\tDataFileName : observations.txt",
-      "\t\tProjection: UTM-32",
-      "\tsection : DESCRIPTION_OF_GRID ------------------------",
-      "\t\tZRange : 0, 11",
-      "\t\tSpacing : 2.500000",
-      "\tsection : CALCULATION_PARAMETERS ---------------------",
-      "\t\tSearchRadius: 2500.000000",
-      "\t\tMaxExtrapolationDistance : 5.000000, 10.000000",
-      "\t\tAnalysis : bilinear",
-      "\tsection : OBJECTIVE_ANALYSIS_PARAMETERS --------------",
-      "\t\tZeroCrossingDistance: 2500.000000",
-      "\t\tDecayDistance : 1200.000000",
-      "\t\tErrorVariance : 10.000000",
-      "\t\tMinData : -5.000000",
-      "\t\tMaxData : 40.000000",
-      "\t\tFilterOperations : 1",
-      "\t\tCorrelationSampleSize : 8",
-      "\t\tFilterType : 12 pts filter "};
-  const auto lines = splitLines(log);
-  ASSERT_GE(lines.size(), echo.size() + 2) << log;
-  for (std::size_t i = 0; i < echo.size(); ++i) {
-    EXPECT_EQ(withFileNamesResolved(lines[i], dir.path()), withFileNamesResolved(echo[i], dir.path()))
-        << "line " << i + 1;
+}
+
+TEST(RunSummary, CountsWhereTheObservationsLie) {
+  TempDir dir;
+  writeSummaryCase(dir);
+  const CaseRun r = runCase(dir);
+  ASSERT_EQ(r.exitCode, 0) << r.log;
+  // Wet nodes: 80 water columns, each wet at the nine levels above its bed (-45 .. -5 m).
+  int shape[3];
+  const std::vector<float> v = readResult(dir.file("result.nc"), nullptr, shape);
+  ASSERT_EQ(v.size(), 1000u);
+  int estimated = 0;
+  for (int l = 1; l < 10; ++l) {
+    for (int j = 0; j < 10; ++j) {
+      for (int i = 2; i < 10; ++i) estimated += v[(l * 10 + j) * 10 + i] != -1e-30f ? 1 : 0;
+    }
   }
-  const std::vector<std::string> rest(lines.begin() + echo.size(), lines.end());
-  EXPECT_NE(rest[0].find("OUTPUT_DATA"), std::string::npos) << rest[0];
-  EXPECT_EQ(rest[1], "Error in parameter file");
-  EXPECT_EQ(log.substr(log.size() - runTimeBlock("Abnormal").size()), runTimeBlock("Abnormal"));
+  ASSERT_GT(estimated, 0);
+  EXPECT_TRUE(contains(r.err, "karnet: result: ")) << r.err;
+  EXPECT_TRUE(contains(r.err, "result.nc\nkarnet: grid: 10 x 10 x 10 nodes, " +
+                                  std::to_string(estimated) +
+                                  " of 720 wet nodes estimated\n"
+                                  "karnet: observations: 7 read, 3 used (in the water inside the "
+                                  "grid), 2 outside the grid, 1 on land, 1 below the bed\n"))
+      << r.err;
+  EXPECT_FALSE(contains(r.err, "warning")) << r.err;
+  // The log is as it always was: no summary in it.
+  EXPECT_FALSE(contains(r.log, "karnet:"));
+}
+
+TEST(RunSummary, QuietRunSaysNothingButTheErrorThatStopsIt) {
+  TempDir dir;
+  writeSummaryCase(dir);
+  // Anywhere before the parameter file.
+  for (const auto& args : std::vector<std::vector<std::string>>{
+           {"--quiet", "case.pfs"}, {"-debug", "--QUIET", "case.pfs"}}) {
+    const ProcessResult r = runKarnet(args, dir.path(), kBatch);
+    EXPECT_EQ(r.exitCode, 0) << args[0];
+    EXPECT_EQ(r.err, "") << args[0];
+  }
+  // Not after it: the usage is broken.
+  EXPECT_EQ(runKarnet({"case.pfs", "--quiet"}, dir.path(), kBatch).exitCode, 1);
+  writeFile(dir.file("observations.txt"), "500 500 -10 5\n500 500 -10\n");
+  const ProcessResult bad = runKarnet({"--quiet", "case.pfs"}, dir.path(), kBatch);
+  EXPECT_EQ(bad.exitCode, 1);
+  EXPECT_TRUE(contains(bad.err, "karnet: observations.txt:2: 4 numbers expected")) << bad.err;
 }
 
 }  // namespace

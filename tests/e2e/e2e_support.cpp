@@ -2,6 +2,7 @@
 
 #include <dirent.h>
 #include <fcntl.h>
+#include <netcdf.h>
 #include <signal.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -105,6 +106,28 @@ ProcessResult runKarnet(const std::vector<std::string>& args, const std::string&
   return runProgram(KARNET_BINARY, args, cwd, env, whileRunning);
 }
 
+CaseRun runCase(const TempDir& dir, const std::vector<std::string>& args,
+                const std::map<std::string, std::string>& env,
+                const std::function<bool(int)>& whileRunning) {
+  CaseRun run;
+  static_cast<ProcessResult&>(run) = runKarnet(args, dir.path(), env, whileRunning);
+  const std::string pfs = args.empty() ? "" : args.back();
+  run.log = readFile(dir.file(pfs.substr(0, pfs.rfind('.')) + ".log"));
+  return run;
+}
+
+bool contains(const std::string& text, const std::string& part) {
+  return text.find(part) != std::string::npos;
+}
+
+std::string linesStartingWith(const std::string& text, const std::string& prefix, bool keep) {
+  std::string kept;
+  for (const std::string& line : splitLines(text)) {
+    if ((line.rfind(prefix, 0) == 0) == keep) kept += line + "\n";
+  }
+  return kept;
+}
+
 std::string ParameterFile::render() const {
   auto kept = [this](const std::string& section) {
     for (const auto& name : omit) {
@@ -156,12 +179,6 @@ std::string ParameterFile::render() const {
   p << "EndSect  // Q4_DIGITIZING_OF_DATA\n";
   return p.str();
 }
-
-}  // namespace karnet::e2e
-
-#include <netcdf.h>
-
-namespace karnet::e2e {
 
 namespace {
 void check(int status, const char* what) {
@@ -218,21 +235,20 @@ void writeBathymetry(const std::string& path, const BathymetrySpec& grid) {
   check(nc_close(nc), "close");
 }
 
-}  // namespace karnet::e2e
-
-namespace karnet::e2e {
+BathymetrySpec localBasin(int nx, int ny, double spacing, float height, double x0, double y0) {
+  BathymetrySpec b;
+  b.nx = nx;
+  b.ny = ny;
+  b.spacing = spacing;
+  b.projection = "LOCAL";
+  b.originLongitude = x0;
+  b.originLatitude = y0;
+  b.heights.assign(static_cast<std::size_t>(nx) * ny, height);
+  return b;
+}
 
 std::string writeSmallCase(const TempDir& dir, const ParameterFile& parameters) {
-  BathymetrySpec b;
-  b.nx = 30;
-  b.ny = 24;
-  b.spacing = 250.0;
-  b.projection = "LOCAL";
-  b.originLongitude = 1000.0;
-  b.originLatitude = 2000.0;
-  b.orientation = 0.0;
-  b.landValue = 10.0f;
-  b.heights.resize(static_cast<std::size_t>(b.nx) * b.ny);
+  BathymetrySpec b = localBasin(30, 24, 250.0, 0.0f);
   for (int j = 0; j < b.ny; ++j) {
     for (int i = 0; i < b.nx; ++i) {
       const bool dry = i >= 25 && j >= 19;
@@ -256,6 +272,26 @@ std::string writeSmallCase(const TempDir& dir, const ParameterFile& parameters) 
   writeFile(dir.file("observations.txt"), obs.str());
   writeFile(dir.file("case.pfs"), parameters.render());
   return obs.str();
+}
+
+std::vector<double> readVariable(const std::string& path, const char* name) {
+  int nc = 0, var = 0, ndims = 0;
+  std::vector<double> values;
+  if (nc_open(path.c_str(), NC_NOWRITE, &nc) != NC_NOERR) return values;
+  if (nc_inq_varid(nc, name, &var) == NC_NOERR && nc_inq_varndims(nc, var, &ndims) == NC_NOERR) {
+    std::vector<int> dims(ndims);
+    nc_inq_vardimid(nc, var, dims.data());
+    std::size_t total = 1;
+    for (int d : dims) {
+      std::size_t length = 0;
+      nc_inq_dimlen(nc, d, &length);
+      total *= length;
+    }
+    values.resize(total);
+    if (nc_get_var_double(nc, var, values.data()) != NC_NOERR) values.clear();
+  }
+  nc_close(nc);
+  return values;
 }
 
 std::vector<float> readResult(const std::string& path, std::string* itemName, int shape[3]) {

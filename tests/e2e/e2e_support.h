@@ -32,6 +32,25 @@ ProcessResult runKarnet(const std::vector<std::string>& args, const std::string&
                         const std::map<std::string, std::string>& env = {},
                         const std::function<bool(int)>& whileRunning = {});
 
+// Batch mode: karnet writes its messages to the log only.
+inline const std::map<std::string, std::string> kBatch = {{"buildmode", "nigth"}};
+
+// A karnet run in dir on the parameter file that ends args, with the log it left there.
+struct CaseRun : ProcessResult {
+  std::string log;
+};
+CaseRun runCase(const TempDir& dir, const std::vector<std::string>& args = {"case.pfs"},
+                const std::map<std::string, std::string>& env = kBatch,
+                const std::function<bool(int)>& whileRunning = {});
+
+bool contains(const std::string& text, const std::string& part);
+// The lines of text that start with prefix, or (keep false) all the others.
+std::string linesStartingWith(const std::string& text, const std::string& prefix, bool keep = true);
+// A log without its CPU time, the only line that differs between runs of one case.
+inline std::string withoutCpuTime(const std::string& log) {
+  return linesStartingWith(log, "-- CPU time", false);
+}
+
 void writeFile(const std::string& path, const std::string& text);
 std::string readFile(const std::string& path);  // empty when missing
 bool fileExists(const std::string& path);
@@ -43,7 +62,7 @@ std::vector<std::string> splitLines(const std::string& text);
 struct ParameterFile {
   std::string dataFileName = "|observations.txt|";
   std::string fileName = "|bathymetry.nc|";
-  std::string projection = "'UTM-32'";
+  std::string projection = "'LOCAL'";
   std::string zRange = "0, 11";
   std::string spacing = "2.5";
   std::string searchRadius = "2500";
@@ -65,11 +84,6 @@ struct ParameterFile {
   std::string render() const;
 };
 
-}  // namespace karnet::e2e
-
-
-namespace karnet::e2e {
-
 // A bathymetry file in the layout karnet reads, written directly with the NetCDF library.
 // heights holds nx * ny values, x fastest, row 0 at the origin (south-west).
 struct BathymetrySpec {
@@ -84,16 +98,19 @@ struct BathymetrySpec {
   float landValue = 10.0f;
 };
 void writeBathymetry(const std::string& path, const BathymetrySpec& grid);
-
-}  // namespace karnet::e2e
-
-namespace karnet::e2e {
+// nx x ny nodes of the given spacing, all at one height, in the LOCAL projection (plain metres)
+// with the origin at (x0, y0).
+BathymetrySpec localBasin(int nx, int ny, double spacing, float height, double x0 = 1000.0,
+                          double y0 = 2000.0);
 
 // A small complete case in dir: a 30 x 24 node basin of 250 m cells with a dry corner
 // (land value 10), in the LOCAL projection with its origin at (1000, 2000) and orientation 0,
 // and casts of a temperature that falls with depth and rises towards the east.
 // Returns the observation text it wrote.
 std::string writeSmallCase(const TempDir& dir, const ParameterFile& parameters);
+
+// The values of a NetCDF variable as doubles; empty when the file or the variable is missing.
+std::vector<double> readVariable(const std::string& path, const char* name);
 
 // Reads a result file's only item (time, z, y, x) as floats; shape gets (nz, ny, nx).
 std::vector<float> readResult(const std::string& path, std::string* itemName, int shape[3]);

@@ -30,16 +30,7 @@ struct Outcome {
   std::string karnetLines;  // the lines karnet wrote to stderr
 };
 
-std::string withoutLines(const std::string& text, const std::string& marker,
-                         bool keepMatching) {
-  std::string kept;
-  for (const std::string& line : splitLines(text)) {
-    if ((line.find(marker) != std::string::npos) == keepMatching) kept += line + "\n";
-  }
-  return kept;
-}
-
-Outcome runCase(const ParameterFile& parameters, int ranks) {
+Outcome runOver(const ParameterFile& parameters, int ranks) {
   TempDir dir;
   writeSmallCase(dir, parameters);
   Outcome o;
@@ -49,12 +40,10 @@ Outcome runCase(const ParameterFile& parameters, int ranks) {
     o.process = runProgram(KARNET_MPIEXEC, {"-np", std::to_string(ranks), KARNET_BINARY, "case.pfs"},
                            dir.path(), kEnvironment);
   }
-  o.log = withoutLines(readFile(dir.file("case.log")), "CPU time", false);
+  o.log = withoutCpuTime(readFile(dir.file("case.log")));
   o.result = readFile(dir.file("result.nc"));
   // mpirun adds notes of its own when a rank ends with an error.
-  for (const std::string& line : splitLines(o.process.err)) {
-    if (line.rfind("karnet", 0) == 0) o.karnetLines += line + "\n";
-  }
+  o.karnetLines = linesStartingWith(o.process.err, "karnet");
   return o;
 }
 
@@ -68,7 +57,7 @@ class MpiRun : public testing::Test {
 
   // Runs plainly and over 2 and 3 ranks; the outcomes must agree.
   void expectSameAsPlain(const ParameterFile& parameters, int exitCode) {
-    const Outcome plain = runCase(parameters, 0);
+    const Outcome plain = runOver(parameters, 0);
     ASSERT_EQ(plain.process.exitCode, exitCode) << plain.process.err;
     if (exitCode == 0) {
       ASSERT_GT(plain.result.size(), 1000u);
@@ -77,7 +66,7 @@ class MpiRun : public testing::Test {
     }
     for (int ranks : {2, 3}) {
       SCOPED_TRACE(testing::Message() << ranks << " ranks");
-      const Outcome shared = runCase(parameters, ranks);
+      const Outcome shared = runOver(parameters, ranks);
       EXPECT_EQ(shared.process.exitCode, plain.process.exitCode) << shared.process.err;
       EXPECT_EQ(shared.karnetLines, plain.karnetLines);
       EXPECT_EQ(shared.log, plain.log);
@@ -86,40 +75,36 @@ class MpiRun : public testing::Test {
   }
 };
 
-TEST_F(MpiRun, BilinearRunGivesThePlainRunsBytes) {
-  ParameterFile p;
-  p.projection = "'LOCAL'";
-  p.filterOperations = "2";
-  expectSameAsPlain(p, 0);
-}
-
-TEST_F(MpiRun, ObjectiveAnalysisFromALevelAboveTheFirst) {
-  ParameterFile p;
-  p.projection = "'LOCAL'";
-  p.analysis = "objective";
-  p.zRange = "3, 11";
-  p.filterType = "'shapiro'";
-  expectSameAsPlain(p, 0);
-}
-
-TEST_F(MpiRun, ResultThatCannotBeWrittenEndsEveryRankWithoutAFile) {
-  ParameterFile p;
-  p.projection = "'LOCAL'";
-  p.outputFileName = "|no such folder/result.nc|";
-  expectSameAsPlain(p, 1);
-}
-
-TEST_F(MpiRun, InvalidSettingsEndEveryRankWithTheSameMessage) {
-  ParameterFile p;
-  p.projection = "'LOCAL'";
-  p.spacing = "0";
-  expectSameAsPlain(p, 1);
+// Runs that complete, and runs that every rank ends with the same error.
+TEST_F(MpiRun, GivesThePlainRunsExitCodeMessagesLogAndBytes) {
+  const struct {
+    const char* name;
+    std::function<void(ParameterFile&)> edit;
+    int exitCode;
+  } cases[] = {
+      {"bilinear", [](ParameterFile& p) { p.filterOperations = "2"; }, 0},
+      {"objective analysis from a level above the first",
+       [](ParameterFile& p) {
+         p.analysis = "objective";
+         p.zRange = "3, 11";
+         p.filterType = "'shapiro'";
+       },
+       0},
+      {"result that cannot be written",
+       [](ParameterFile& p) { p.outputFileName = "|no such folder/result.nc|"; }, 1},
+      {"invalid settings", [](ParameterFile& p) { p.spacing = "0"; }, 1},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    ParameterFile p;
+    c.edit(p);
+    expectSameAsPlain(p, c.exitCode);
+  }
 }
 
 TEST_F(MpiRun, CrossValidationIsRefusedOverSeveralRanks) {
   TempDir dir;
   ParameterFile p;
-  p.projection = "'LOCAL'";
   p.analysis = "objective";
   writeSmallCase(dir, p);
   const ProcessResult run = runProgram(
@@ -151,12 +136,7 @@ int rankIn(const std::string& dir, int rank) {
 
 // A basin large enough to be interrupted while its levels are analysed.
 void writeSlowCase(const TempDir& dir) {
-  BathymetrySpec b;
-  b.nx = b.ny = 300;
-  b.spacing = 100.0;
-  b.projection = "LOCAL";
-  b.originLongitude = b.originLatitude = 0.0;
-  b.heights.assign(static_cast<std::size_t>(b.nx) * b.ny, -61.0f);
+  const BathymetrySpec b = localBasin(300, 300, 100.0, -61.0f, 0.0, 0.0);
   writeBathymetry(dir.file("bathymetry.nc"), b);
   std::ostringstream obs;
   for (int j = 5; j < b.ny; j += 10) {
@@ -166,7 +146,6 @@ void writeSlowCase(const TempDir& dir) {
   }
   writeFile(dir.file("observations.txt"), obs.str());
   ParameterFile p;
-  p.projection = "'LOCAL'";
   p.analysis = "objective";
   p.zRange = "0, 39";
   p.spacing = "1.5";

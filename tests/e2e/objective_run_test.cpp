@@ -23,14 +23,9 @@ const std::vector<reference::Cell> kCasts = {{2, 2, 10.0}, {5, 3, 16.0}, {3, 5, 
 // An 8 x 7 node basin of 250 m cells, 25 m deep, with a dry rim (LOCAL, origin
 // (1000, 2000)). Decay length 500 m, zero crossing 1250 m, error variance 10 %.
 void writeCase(const TempDir& dir, ParameterFile p) {
-  BathymetrySpec b;
-  b.nx = kNx;
-  b.ny = kNy;
-  b.projection = "LOCAL";
-  b.originLongitude = 1000.0;
-  b.originLatitude = 2000.0;
+  BathymetrySpec b = localBasin(kNx, kNy, 250.0, -25.0f);
   for (int j = 0; j < kNy; ++j)
-    for (int i = 0; i < kNx; ++i) b.heights.push_back(dry(i, j) ? b.landValue : -25.0f);
+    for (int i = 0; i < kNx; ++i) b.heights[j * kNx + i] = dry(i, j) ? b.landValue : -25.0f;
   writeBathymetry(dir.file("bathymetry.nc"), b);
   std::ostringstream obs;
   for (const auto& cast : kCasts) {
@@ -40,7 +35,6 @@ void writeCase(const TempDir& dir, ParameterFile p) {
     }
   }
   writeFile(dir.file("observations.txt"), obs.str());
-  p.projection = "'LOCAL'";
   p.zRange = "0, 9";
   p.spacing = "2";
   p.searchRadius = "10000";
@@ -70,15 +64,11 @@ TEST(ObjectiveRun, EveryWetNodeIsTheSmoothedClippedEstimate) {
     ParameterFile p;
     p.filterType = c.filterType;
     p.filterOperations = c.operations;
-    std::ostringstream bound;
-    bound << c.minData;
-    p.minData = bound.str();
-    bound.str("");
-    bound << c.maxData;
-    p.maxData = bound.str();
+    p.minData = std::to_string(c.minData);
+    p.maxData = std::to_string(c.maxData);
     writeCase(dir, p);
-    const ProcessResult r = runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}});
-    ASSERT_EQ(r.exitCode, 0) << readFile(dir.file("case.log"));
+    const CaseRun r = runCase(dir);
+    ASSERT_EQ(r.exitCode, 0) << r.log;
 
     reference::Field expected{kNx, kNy, {}, [](double v) { return std::isnan(v); }};
     for (int j = 0; j < kNy; ++j) {

@@ -2,7 +2,6 @@
 // than the memory the process may have, and very long observation files.
 #include <gtest/gtest.h>
 #include <sys/mount.h>
-#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -57,7 +56,6 @@ std::vector<std::string> leftovers(const std::string& dir) {
 TEST(ResultSafety, TwoRunsWritingOneResultLeaveOneCompleteFile) {
   TempDir dir;
   ParameterFile p;
-  p.projection = "'LOCAL'";
   const std::string observations = writeSmallCase(dir, p);
   // Run b sees the same casts 100 degrees warmer, so its result differs in every wet node.
   std::string warmer;
@@ -99,22 +97,11 @@ TEST(ResultSafety, TwoRunsWritingOneResultLeaveOneCompleteFile) {
   EXPECT_EQ(seenA + seenB, 8);
 }
 
-// Runs karnet with its address space limited to limitBytes.
+// Runs karnet with its address space limited to limitBytes; gives its exit code.
 int runLimited(const std::string& dir, std::uint64_t limitBytes) {
-  const pid_t pid = fork();
-  if (pid == 0) {
-    struct rlimit limit = {limitBytes, limitBytes};
-    if (setrlimit(RLIMIT_AS, &limit) != 0) _exit(126);
-    static char quiet[] = "buildmode=nigth";
-    static char* const environment[] = {quiet, nullptr};
-    const std::string program = KARNET_BINARY;
-    char parameterFile[] = "case.pfs";
-    char* const argv[] = {const_cast<char*>(program.c_str()), parameterFile, nullptr};
-    if (chdir(dir.c_str()) != 0) _exit(127);
-    execve(program.c_str(), argv, environment);
-    _exit(127);
-  }
-  return waitFor(pid);
+  const std::string command =
+      "ulimit -v " + std::to_string(limitBytes >> 10) + " && exec " KARNET_BINARY " case.pfs";
+  return runProgram("/bin/sh", {"-c", command}, dir, kBatch).exitCode;
 }
 
 TEST(ResultSafety, GridsBeyondTheMemoryLimitStopBeforeAllocating) {
@@ -126,7 +113,6 @@ TEST(ResultSafety, GridsBeyondTheMemoryLimitStopBeforeAllocating) {
     SCOPED_TRACE("result grid");
     TempDir dir;
     ParameterFile p;
-    p.projection = "'LOCAL'";
     p.zRange = "0, 2000000";  // 30 x 24 x 2000001 nodes: 5.8 GB of floats
     writeSmallCase(dir, p);
     writeFile(dir.file("result.nc"), "earlier\n");
@@ -141,9 +127,7 @@ TEST(ResultSafety, GridsBeyondTheMemoryLimitStopBeforeAllocating) {
   {
     SCOPED_TRACE("basic grid");
     TempDir dir;
-    ParameterFile p;
-    p.projection = "'LOCAL'";
-    const std::string observations = writeSmallCase(dir, p);
+    const std::string observations = writeSmallCase(dir, ParameterFile{});
     // One cast 800 km away stretches the basic grid over 3202 x 3202 x 14 nodes.
     const std::string more = observations + "801000 802000 -3 7\n";
     writeFile(dir.file("observations.txt"), more);
@@ -174,7 +158,6 @@ TEST(ResultSafety, AFullDiskKeepsTheEarlierResult) {
     ~Unmount() { umount2(path.c_str(), MNT_DETACH); }
   } unmount{mountPoint};
   ParameterFile p;
-  p.projection = "'LOCAL'";
   p.outputFileName = "|small/result.nc|";
   writeSmallCase(dir, p);
   writeFile(dir.file("small/result.nc"), "earlier\n");
@@ -184,19 +167,16 @@ TEST(ResultSafety, AFullDiskKeepsTheEarlierResult) {
   while (filler.write(block.data(), block.size())) {
   }
   filler.close();
-  const ProcessResult r = runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}});
-  const std::string log = readFile(dir.file("case.log"));
-  EXPECT_EQ(r.exitCode, 1) << log;
-  EXPECT_NE(log.find("\nERROR while writing result file\n"), std::string::npos) << log;
+  const CaseRun r = runCase(dir);
+  EXPECT_EQ(r.exitCode, 1) << r.log;
+  EXPECT_TRUE(contains(r.log, "\nERROR while writing result file\n")) << r.log;
   EXPECT_EQ(readFile(dir.file("small/result.nc")), "earlier\n");
   EXPECT_TRUE(leftovers(mountPoint).empty());
 }
 
 TEST(ResultSafety, FiveMillionObservationLinesAreRead) {
   TempDir dir;
-  ParameterFile p;
-  p.projection = "'LOCAL'";
-  writeSmallCase(dir, p);
+  writeSmallCase(dir, ParameterFile{});
   // Five casts, each repeated a million times: the same answer as one of each.
   const std::vector<std::string> casts = {"1250 2500 -2 8\n", "3500 4000 -4 7\n",
                                           "5000 3000 -6 6\n", "2000 6000 -3 5\n",
@@ -210,10 +190,10 @@ TEST(ResultSafety, FiveMillionObservationLinesAreRead) {
     writeFile(dir.file("observations.txt"), text);
   }
   const auto start = std::chrono::steady_clock::now();
-  const ProcessResult many = runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}});
+  const CaseRun many = runCase(dir);
   [[maybe_unused]] const double seconds =
       std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
-  ASSERT_EQ(many.exitCode, 0) << readFile(dir.file("case.log"));
+  ASSERT_EQ(many.exitCode, 0) << many.log;
 #ifndef KARNET_SANITIZED
   EXPECT_LT(seconds, 60.0);  // about 3 s on a quiet machine: nothing grows with the line count squared
 #endif
@@ -223,7 +203,7 @@ TEST(ResultSafety, FiveMillionObservationLinesAreRead) {
   std::string once;
   for (const std::string& cast : casts) once += cast;
   writeFile(dir.file("observations.txt"), once);
-  ASSERT_EQ(runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}}).exitCode, 0);
+  ASSERT_EQ(runCase(dir).exitCode, 0);
   EXPECT_EQ(readResult(dir.file("result.nc"), nullptr, shape), manyValues);
 }
 

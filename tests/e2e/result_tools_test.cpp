@@ -19,7 +19,6 @@ constexpr double kDeg = test::kDegree;
 constexpr double kLon0 = 11.3, kLat0 = 55.2;
 constexpr int kNx = 40, kNy = 30;
 constexpr double kCell = 250.0;
-const std::map<std::string, std::string> kBatch = {{"buildmode", "nigth"}};
 
 bool haveTool(const char* path) { return std::filesystem::exists(path); }
 bool havePythonModule(const char* module) {
@@ -75,29 +74,9 @@ void writeUtmCase(const TempDir& dir, double turn, const std::string& projection
   writeFile(dir.file("case.pfs"), p.render());
 }
 
-void runCase(const TempDir& dir) {
-  const ProcessResult r = runKarnet({"--quiet", "case.pfs"}, dir.path(), kBatch);
-  ASSERT_EQ(r.exitCode, 0) << readFile(dir.file("case.log")) << r.err;
-}
-
-std::vector<double> readVariable(const std::string& path, const char* name) {
-  int nc = 0, var = 0, ndims = 0;
-  std::vector<double> values;
-  if (nc_open(path.c_str(), NC_NOWRITE, &nc) != NC_NOERR) return values;
-  if (nc_inq_varid(nc, name, &var) == NC_NOERR && nc_inq_varndims(nc, var, &ndims) == NC_NOERR) {
-    std::vector<int> dims(ndims);
-    nc_inq_vardimid(nc, var, dims.data());
-    std::size_t total = 1;
-    for (int d : dims) {
-      std::size_t length = 0;
-      nc_inq_dimlen(nc, d, &length);
-      total *= length;
-    }
-    values.resize(total);
-    nc_get_var_double(nc, var, values.data());
-  }
-  nc_close(nc);
-  return values;
+void runQuietly(const TempDir& dir) {
+  const CaseRun r = runCase(dir, {"--quiet", "case.pfs"});
+  ASSERT_EQ(r.exitCode, 0) << r.log << r.err;
 }
 
 std::vector<double> numbers(const std::string& text) {
@@ -112,7 +91,7 @@ TEST(ResultTools, GdalPlacesAnUnrotatedUtmResult) {
   if (!havePythonModule("osgeo.gdal")) GTEST_SKIP() << "GDAL's Python bindings not installed";
   TempDir dir;
   writeUtmCase(dir, 0.0);
-  runCase(dir);
+  runQuietly(dir);
   // GDAL's corners of the grid (cell edges, half a cell beyond the outer nodes) in WGS 84.
   const ProcessResult gdal = runProgram(
       "/usr/bin/python3",
@@ -152,7 +131,7 @@ TEST(ResultTools, XarraySelectsALevelByDepth) {
   if (!havePythonModule("xarray")) GTEST_SKIP() << "xarray not installed";
   TempDir dir;
   writeUtmCase(dir, 0.0);
-  runCase(dir);
+  runQuietly(dir);
   const ProcessResult py = runProgram(
       "/usr/bin/python3",
       {"-c",
@@ -173,7 +152,7 @@ TEST(ResultTools, CdoCutsAndRemapsAnUnrotatedResultByLongitudeAndLatitude) {
   if (!haveTool("/usr/bin/cdo")) GTEST_SKIP() << "cdo not installed";
   TempDir dir;
   writeUtmCase(dir, 0.0);
-  runCase(dir);
+  runQuietly(dir);
   const std::vector<double> lon = readVariable(dir.file("result.nc"), "lon");
   const std::vector<double> lat = readVariable(dir.file("result.nc"), "lat");
   ASSERT_EQ(lon.size(), static_cast<std::size_t>(kNx * kNy));
@@ -216,7 +195,7 @@ TEST(ResultTools, TurnedResultIsPlacedThroughItsGeolocationArrays) {
   }
   TempDir dir;
   writeUtmCase(dir, 25.0);
-  runCase(dir);
+  runQuietly(dir);
 
   // Every node where PROJ puts the grid turned back from its own axes, by the angle the
   // run used: the orientation it records (the bathymetry keeps it in single precision)

@@ -291,6 +291,7 @@ TEST_F(MkgridRaster, KarnetRunsOnTheMadeBathymetry) {
   e2e::writeFile(file("observations.txt"), casts);
   e2e::ParameterFile parameters;
   parameters.fileName = "|test.nc|";
+  parameters.projection = "'UTM-32'";
   e2e::writeFile(file("case.pfs"), parameters.render());
   const e2e::ProcessResult run = e2e::runKarnet({"case.pfs"}, dir);
   EXPECT_EQ(run.exitCode, 0) << run.err << e2e::readFile(file("case.log"));
@@ -347,8 +348,10 @@ TEST_F(MkgridRaster, BadInputIsNamedAndLeavesNoFile) {
   EXPECT_NE(runMkgrid("--version", &code).find("karnet-mkgrid 1."), std::string::npos);
   EXPECT_EQ(code, 0);
   const std::string help = runMkgrid("--help", &code);
+  EXPECT_EQ(code, 0);
   for (const char* option : {"--spacing", "--extent", "--extent-proj", "--variable",
-                             "--orientation", "--resampling", "--source-crs", "auto"}) {
+                             "--orientation", "--resampling", "--source-crs", "--land-value",
+                             "auto"}) {
     EXPECT_NE(help.find(option), std::string::npos) << option;
   }
 }

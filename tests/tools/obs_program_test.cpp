@@ -155,7 +155,7 @@ TEST(ObsProgram, TimeWindowAndBox) {
   EXPECT_EQ(kept[1][3], 2.0);
 }
 
-TEST(ObsProgram, BadInputStopsWithoutOutput) {
+TEST(ObsProgram, BadInputStopsWithoutOutputAndHelpNeedsNone) {
   const TempDir dir;
   writeFile(dir.file("obs.txt"), "earlier result\n");
   writeFile(dir.file("text.csv"), "lon,lat,depth,value\n10,55,5,1\n10,55,five,2\n");
@@ -207,10 +207,7 @@ TEST(ObsProgram, BadInputStopsWithoutOutput) {
   EXPECT_EQ(skip.exitCode, 0);
   EXPECT_NE(skip.err.find("kept 1 of 2 rows;"), std::string::npos);
   EXPECT_NE(skip.err.find(", 1 unparsable"), std::string::npos);
-}
-
-TEST(ObsProgram, HelpAndVersion) {
-  const TempDir dir;
+  // --help and --version need no input.
   const ProcessResult help = runObs({"--help"}, dir);
   EXPECT_EQ(help.exitCode, 0);
   EXPECT_NE(help.out.find("Usage: karnet-obs"), std::string::npos);
@@ -248,6 +245,7 @@ TEST(ObsProgram, KarnetRunsOnTheOutput) {
   ASSERT_EQ(obs.exitCode, 0) << obs.err;
 
   ParameterFile p;
+  p.projection = "'UTM-32'";
   p.zRange = "0, 9";
   p.spacing = "2";
   p.searchRadius = "3000";
