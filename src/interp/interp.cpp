@@ -39,34 +39,31 @@ struct InterpolationCounts {
   std::int64_t none = 0;
 };
 
-// Working storage of the thread that analyses a layer: the layer's values and
-// bed, the copy of the values as they were before the layer's pass (the only
-// data the estimators see) and the search tables of that copy.
+// Working storage of the thread that analyses a layer: the copy of the
+// layer's values as they were before the layer's pass (the only data the
+// estimators see) and the search tables of that copy. The layer itself is
+// worked on in place: no other layer's pass touches it.
 class LayerWorkspace {
  public:
   LayerWorkspace(std::int32_t nj, std::int32_t nk)
-      : size_(static_cast<std::size_t>(nj) * static_cast<std::size_t>(nk)),
-        values_(size_), bed_(size_), scratch_(size_), tables(nj, nk) {
-    values = FloatGrid2D{0, 0, nj, nk, values_.data()};
-    bed = FloatGrid2D{0, 0, nj, nk, bed_.data()};
+      : scratch_(static_cast<std::size_t>(nj) * static_cast<std::size_t>(nk)), tables(nj, nk) {
     scratch = FloatGrid2D{0, 0, nj, nk, scratch_.data()};
   }
   LayerWorkspace(const LayerWorkspace&) = delete;
   LayerWorkspace& operator=(const LayerWorkspace&) = delete;
 
-  FloatGrid2D values;
-  FloatGrid2D bed;
-  FloatGrid2D scratch;
-
  private:
-  std::size_t size_;
-  std::vector<float> values_;
-  std::vector<float> bed_;
   std::vector<float> scratch_;
 
  public:
+  FloatGrid2D scratch;
   SearchTables tables;
 };
+
+// Layer `level` of a 3-D grid, in place.
+FloatGrid2D layerOf(const FloatGrid3D& grid, std::int32_t level) {
+  return FloatGrid2D{0, 0, grid.nj, grid.nk, grid.data + grid.index(grid.j0, grid.k0, level)};
+}
 
 // Estimate for the empty wet node (j, k) from the data of the scratch layer.
 float estimateNode(std::int32_t j, std::int32_t k, const LayerWorkspace& ws, float reach,
@@ -125,16 +122,16 @@ struct LayerPass {
   WorkProgress* progress;
 };
 
-// Interpolates, blanks, smooths and writes back basic layer `level`.
+// Interpolates, blanks and smooths basic layer `level` in place.
 InterpolationCounts interpolateLayer(const LayerPass& pass, std::int32_t level,
                                      LayerWorkspace& ws) {
-  const std::int64_t nj = ws.values.nj;
-  const std::int64_t layerSize = ws.values.elementCount();
+  const FloatGrid2D values = layerOf(*pass.values, level);
+  const FloatGrid2D bed = layerOf(*pass.bathymetry, level);
+  const std::int64_t nj = values.nj;
+  const std::int64_t layerSize = values.elementCount();
   const double deleteValue = pass.deleteValue;
   const double landValue = pass.landValue;
-  grid3DLayerGet(*pass.bathymetry, level, ws.bed);
-  grid3DLayerGet(*pass.values, level, ws.values);
-  std::memcpy(ws.scratch.data, ws.values.data, static_cast<std::size_t>(layerSize) * sizeof(float));
+  std::memcpy(ws.scratch.data, values.data, static_cast<std::size_t>(layerSize) * sizeof(float));
   ws.tables.build(ws.scratch, deleteValue, pass.rowThreads);
 
   // Every estimate reads only the scratch copy and writes only its own node,
@@ -148,8 +145,8 @@ InterpolationCounts interpolateLayer(const LayerPass& pass, std::int32_t level,
 #pragma omp for schedule(dynamic, 4)
     for (std::int64_t k = pass.kFirst; k <= pass.kLast; ++k) {
       if (progress.stopped()) continue;
-      float* row = ws.values.data + k * nj;
-      const float* bedRow = ws.bed.data + k * nj;
+      float* row = values.data + k * nj;
+      const float* bedRow = bed.data + k * nj;
       for (std::int64_t j = pass.jFirst; j <= pass.jLast; ++j) {
         if (!isEmptyCell(row[j], deleteValue) || isDryCell(bedRow[j], landValue)) continue;
         row[j] = estimateNode(static_cast<std::int32_t>(j), static_cast<std::int32_t>(k), ws,
@@ -165,8 +162,8 @@ InterpolationCounts interpolateLayer(const LayerPass& pass, std::int32_t level,
   // Dry nodes of the footprint hold no value, whatever was binned there.
   const float emptyValue = static_cast<float>(deleteValue);
   for (std::int64_t k = pass.kFirst; k <= pass.kLast; ++k) {
-    float* row = ws.values.data + k * nj;
-    const float* bedRow = ws.bed.data + k * nj;
+    float* row = values.data + k * nj;
+    const float* bedRow = bed.data + k * nj;
     for (std::int64_t j = pass.jFirst; j <= pass.jLast; ++j) {
       if (isDryCell(bedRow[j], landValue)) row[j] = emptyValue;
     }
@@ -175,10 +172,8 @@ InterpolationCounts interpolateLayer(const LayerPass& pass, std::int32_t level,
   // The smoother reads the neighbours as its own pass has left them: it goes
   // through the layer in one fixed order, on this thread.
   for (std::int32_t p = 0; p < pass.filterOperations; ++p) {
-    smoothLayer(ws.values.data, ws.values.nj, ws.values.nk);
+    smoothLayer(values.data, values.nj, values.nk);
   }
-
-  grid3DLayerPut(*pass.values, level, ws.values);
   return InterpolationCounts{bilinear, weighted, none};
 }
 
