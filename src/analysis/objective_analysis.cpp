@@ -281,7 +281,7 @@ void objectiveAnalysis(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOf
                        std::int32_t lOff, RunState& state, const RunContext& context,
                        FloatGrid3D* errorField) {
   const RunSettings& settings = context.settings;
-  setadj(lastObs, state, settings);
+  setadj(lastObs, state, settings, context.threads);
 
   progressStatus("Interpolating ...");
 

@@ -95,7 +95,7 @@ int runPhases(Run& run, RunSummary* summary, std::string* writeProblem) {
   ObservationTally tally;
   dataScan(state, context, parameters.inputFiles.FileName, &lastObs, &jOff, &kOff, &lOff, &tally);
   progressStatus("Scanning bathymetry ...");
-  bathymetryScan(jOff, kOff, lOff, state, settings);
+  bathymetryScan(jOff, kOff, lOff, state, settings, context.threads);
   progressStatus("Initialising ...");
   // The objective analysis also gives the error variance of its estimates,
   // written beside the result's item; nodes without an estimate keep the fill.
@@ -110,7 +110,7 @@ int runPhases(Run& run, RunSummary* summary, std::string* writeProblem) {
     errorField.nl = held.count;
     errorField.total = state.localValues.layerSize() * held.count;
     grid3DAlloc(errorField);
-    grid3DFill(errorField, static_cast<float>(state.deleteValue()));
+    grid3DFill(errorField, static_cast<float>(state.deleteValue()), context.threads);
     objectiveAnalysis(lastObs, jOff, kOff, lOff, state, context, &errorField);
   } else {
     interp(lastObs, jOff, kOff, lOff, state, context);
@@ -123,7 +123,7 @@ int runPhases(Run& run, RunSummary* summary, std::string* writeProblem) {
     if (errorField.data != nullptr) grid3DFree(errorField);
     return written;
   }
-  glo2loc(jOff, kOff, lOff, state, settings);
+  glo2loc(jOff, kOff, lOff, state, settings, context.threads);
   if (summary != nullptr) {
     summary->resultPath = parameters.outputData.FileName;
     summary->observations = tally;

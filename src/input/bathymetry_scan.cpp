@@ -6,13 +6,14 @@
 namespace karnet {
 
 void bathymetryScan(std::int32_t jOff, std::int32_t kOff, std::int32_t lOff, RunState& state,
-                    const RunSettings& s) {
+                    const RunSettings& s, int threads) {
   FloatGrid3D& basic = state.basicBathymetry;
   const FloatGrid2D& bed = state.bathymetryGrid;
-  grid3DFill(basic, static_cast<float>(state.landValue));
-  // Each node is written at most once, so the scan may go level by level in
-  // memory order: the top level takes every water column, a lower level the
-  // columns whose bed lies below the level's height.
+  grid3DFill(basic, static_cast<float>(state.landValue), threads);
+  // Each node is written at most once, so the scan may go level by level, the
+  // levels in any order: the top level takes every water column, a lower
+  // level the columns whose bed lies below the level's height.
+#pragma omp parallel for schedule(dynamic, 1) num_threads(threads) if (threads > 1)
   for (std::int32_t l = s.lx; l >= s.l0; --l) {
     const bool top = l == s.lx;
     const float height = static_cast<float>(l - s.lx - 1) * s.dz;

@@ -9,7 +9,7 @@
 namespace karnet {
 
 void glo2loc(std::int32_t jOff, std::int32_t kOff, std::int32_t lOff, RunState& state,
-             const RunSettings& /*settings*/) {
+             const RunSettings& /*settings*/, int threads) {
   FloatGrid3D& local = state.localValues;
   const FloatGrid3D& basic = state.basicValues;
   if (local.data == nullptr) return;
@@ -21,6 +21,7 @@ void glo2loc(std::int32_t jOff, std::int32_t kOff, std::int32_t lOff, RunState& 
   // not is left empty rather than read from outside the basic array.
   const std::int64_t pLo = std::clamp<std::int64_t>(-std::int64_t{jOff}, 0, njL);
   const std::int64_t pHi = std::clamp<std::int64_t>(nj - jOff, pLo, njL);
+#pragma omp parallel for schedule(static) num_threads(threads) if (threads > 1)
   for (std::int64_t s = 0; s < nlL; ++s) {
     const std::int64_t lb = lOff + s;
     for (std::int64_t q = 0; q < nkL; ++q) {

@@ -9,9 +9,10 @@
 namespace karnet {
 
 // Copies the local grid's window, starting at basic node (jOff, kOff, lOff),
-// out of state.basicValues into every node of state.localValues.
+// out of state.basicValues into every node of state.localValues; levels go to
+// up to `threads` threads.
 void glo2loc(std::int32_t jOff, std::int32_t kOff, std::int32_t lOff, RunState& state,
-             const RunSettings& settings);
+             const RunSettings& settings, int threads = 1);
 
 }  // namespace karnet
 

@@ -182,7 +182,7 @@ InterpolationCounts interpolateLayer(const LayerPass& pass, std::int32_t level,
 void interp(std::int32_t lastObs, std::int32_t jOff, std::int32_t kOff, std::int32_t lOff,
             RunState& state, const RunContext& context) {
   const RunSettings& settings = context.settings;
-  setadj(lastObs, state, settings);
+  setadj(lastObs, state, settings, context.threads);
   progressStatus("Interpolating ...");
 
   const std::int64_t spanJ = std::int64_t{settings.jx} - settings.j0;

@@ -121,7 +121,7 @@ void completeColumn(const Column& c, double deleteValue, double landValue,
 
 }  // namespace
 
-void setadj(std::int32_t lastObs, RunState& state, const RunSettings& settings) {
+void setadj(std::int32_t lastObs, RunState& state, const RunSettings& settings, int threads) {
   FloatGrid3D& values = state.basicValues;
   const FloatGrid3D& bathymetry = state.basicBathymetry;
   const double deleteValue = state.deleteValue();
@@ -131,7 +131,7 @@ void setadj(std::int32_t lastObs, RunState& state, const RunSettings& settings) 
   const std::int32_t nk = values.nk;
   const std::int32_t nl = state.basicLevelCount();
   const bool wholeColumns = state.holdsAllLevels();
-  grid3DFill(values, emptyValue);
+  grid3DFill(values, emptyValue, threads);
 
   // Observations land on few nodes of a large grid: the binned nodes are kept
   // as a list sorted by column, then level, and each column holding data is

@@ -15,7 +15,7 @@ namespace karnet {
 // Rewrites state.basicValues completely; reads state.basicBathymetry,
 // state.landValue and the delete value of state.resultDescription.
 // An observation whose rounded node lies outside the basic grid is skipped.
-void setadj(std::int32_t lastObs, RunState& state, const RunSettings& settings);
+void setadj(std::int32_t lastObs, RunState& state, const RunSettings& settings, int threads = 1);
 
 }  // namespace karnet
 

@@ -63,9 +63,17 @@ void grid3DFree(FloatGrid3D& grid) {
   grid.data = nullptr;
 }
 
-void grid3DFill(FloatGrid3D& grid, float value) {
+void grid3DFill(FloatGrid3D& grid, float value, int threads) {
   if (grid.data == nullptr || grid.total <= 0) return;
-  std::fill(grid.data, grid.data + grid.total, value);
+  // In pieces over the threads: a new grid's pages are then also first
+  // touched (and so mapped) on all of them.
+  constexpr std::int64_t kPiece = std::int64_t{1} << 20;
+  const std::int64_t total = grid.total;
+  float* data = grid.data;
+#pragma omp parallel for schedule(static) num_threads(threads) if (threads > 1 && total > kPiece)
+  for (std::int64_t at = 0; at < total; at += kPiece) {
+    std::fill(data + at, data + std::min(total, at + kPiece), value);
+  }
 }
 
 void grid3DLayerGet(const FloatGrid3D& grid, std::int32_t l, FloatGrid2D& layer) {

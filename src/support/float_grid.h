@@ -61,7 +61,8 @@ void grid2DFree(FloatGrid2D& grid);
 void grid3DFree(FloatGrid3D& grid);
 
 // Every element of the grid becomes value.
-void grid3DFill(FloatGrid3D& grid, float value);
+// Sets every value of the grid, on up to `threads` threads.
+void grid3DFill(FloatGrid3D& grid, float value, int threads = 1);
 
 // Copies horizontal layer l of a 3-D grid into a 2-D grid of the same x and y
 // counts, and back.
