@@ -127,7 +127,8 @@ int runPhases(Run& run, RunSummary* summary, std::string* writeProblem) {
   if (summary != nullptr) {
     summary->resultPath = parameters.outputData.FileName;
     summary->observations = tally;
-    countResultNodes(state.bathymetryGrid, state.landValue, settings, state.localValues, summary);
+    countResultNodes(state.bathymetryGrid, state.landValue, settings, state.localValues, summary,
+                     context.threads);
   }
   progressStatus("Saving data ...");
   const TextAttributes attributes = resultGlobalAttributes(

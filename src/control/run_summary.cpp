@@ -13,16 +13,19 @@ void countResultLevel(const FloatGrid2D& bed, double landValue, const RunSetting
   const std::int64_t columns = std::int64_t{bed.nj} * bed.nk;
   const bool top = l == s.lx;
   const float height = static_cast<float>(l - s.lx - 1) * s.dz;
+  std::int64_t wet = 0, estimated = 0;
   for (std::int64_t c = 0; c < columns; ++c) {
     const float b = bed.data[c];
     if (!(landValue > static_cast<double>(b)) || !(top || height > b)) continue;
-    ++summary->wetNodes;
-    if (layer[c] != kDeleteValueFloat) ++summary->estimatedNodes;
+    ++wet;
+    if (layer[c] != kDeleteValueFloat) ++estimated;
   }
+  summary->wetNodes += wet;
+  summary->estimatedNodes += estimated;
 }
 
 void countResultNodes(const FloatGrid2D& bed, double landValue, const RunSettings& s,
-                      const FloatGrid3D& values, RunSummary* summary) {
+                      const FloatGrid3D& values, RunSummary* summary, int threads) {
   summary->nx = values.nj;
   summary->ny = values.nk;
   summary->nz = values.nl;
@@ -30,10 +33,19 @@ void countResultNodes(const FloatGrid2D& bed, double landValue, const RunSetting
   summary->estimatedNodes = 0;
   if (bed.nj != values.nj || bed.nk != values.nk || values.data == nullptr) return;
   const std::int64_t columns = std::int64_t{bed.nj} * bed.nk;
-  // Layer by layer in memory order; local level l0 + n is layer n.
+  // Layer by layer, local level l0 + n being layer n; whole counts, so the
+  // order of the layers does not matter.
+  std::int64_t wet = 0, estimated = 0;
+#pragma omp parallel for schedule(dynamic, 1) num_threads(threads) if (threads > 1) \
+    reduction(+ : wet, estimated)
   for (std::int32_t n = 0; n < values.nl; ++n) {
-    countResultLevel(bed, landValue, s, s.l0 + n, values.data + n * columns, summary);
+    RunSummary level;
+    countResultLevel(bed, landValue, s, s.l0 + n, values.data + n * columns, &level);
+    wet += level.wetNodes;
+    estimated += level.estimatedNodes;
   }
+  summary->wetNodes = wet;
+  summary->estimatedNodes = estimated;
 }
 
 void printRunSummary(std::FILE* stream, const RunSummary& r, bool quiet) {

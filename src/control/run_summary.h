@@ -29,9 +29,9 @@ inline constexpr double kInsideShareWarning = 0.05;
 // Counts the wet nodes of the local grid (the bathymetry scan's rule: every
 // water column is wet at its top level, and below where a level lies above the
 // bed) and those of them that hold a value in values (the local grid, level
-// l0 first).
+// l0 first), its levels on up to `threads` threads.
 void countResultNodes(const FloatGrid2D& bed, double landValue, const RunSettings& settings,
-                      const FloatGrid3D& values, RunSummary* summary);
+                      const FloatGrid3D& values, RunSummary* summary, int threads = 1);
 
 // Adds the wet nodes of local level l (the nodes of layer, x fastest, as
 // many as bed has) and those of them that hold a value to the summary's counts.
