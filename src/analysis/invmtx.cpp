@@ -29,12 +29,8 @@ inline std::int32_t pivotKey(float value, std::int32_t notFree) {
   return magnitude | notFree;
 }
 
-// kSize > 0: the body for blocks of exactly kSize rows (n is kSize), whose
-// loops the compiler lays out for that length; 0: for any n.
-template <std::int32_t kSize>
-[[gnu::always_inline]] inline std::int32_t invert(OaWorkspace& ws, float* a, std::int32_t size,
+[[gnu::always_inline]] inline std::int32_t invert(OaWorkspace& ws, float* a, std::int32_t n,
                                                   float& det) {
-  const std::int32_t n = kSize > 0 ? kSize : size;
   if (n < 1) {
     ws.errorText = "NOBS < 1 in INVMTX";
     return -1;
@@ -197,36 +193,20 @@ template <std::int32_t kSize>
   return 0;
 }
 
-// Small blocks, the usual ones where the data are sparse, each get a body of
-// their own size: with the lengths known the short row loops carry no
-// remainder handling. Every body makes the same operations.
-constexpr std::int32_t kLargestFixedSize = 16;
-
-template <std::int32_t kSize>
-[[gnu::always_inline]] inline std::int32_t invertBySize(OaWorkspace& ws, float* a, std::int32_t n,
-                                                        float& det) {
-  if constexpr (kSize == 0) {
-    return invert<0>(ws, a, n, det);
-  } else {
-    if (n == kSize) return invert<kSize>(ws, a, n, det);
-    return invertBySize<kSize - 1>(ws, a, n, det);
-  }
-}
-
 std::int32_t invertBaseline(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
-  return invertBySize<kLargestFixedSize>(ws, a, n, det);
+  return invert(ws, a, n, det);
 }
 
 #if defined(__x86_64__) && defined(__GNUC__)
 #define KARNET_INVMTX_CLONES 1
 [[gnu::target("avx2")]] std::int32_t invertAvx2(OaWorkspace& ws, float* a, std::int32_t n,
                                                 float& det) {
-  return invertBySize<kLargestFixedSize>(ws, a, n, det);
+  return invert(ws, a, n, det);
 }
 
 [[gnu::target("avx512f,avx512bw,avx512vl,prefer-vector-width=512")]] std::int32_t invertAvx512(
     OaWorkspace& ws, float* a, std::int32_t n, float& det) {
-  return invertBySize<kLargestFixedSize>(ws, a, n, det);
+  return invert(ws, a, n, det);
 }
 #endif
 
