@@ -4,10 +4,11 @@
 #include <libdeflate.h>
 
 #include <algorithm>
-#include <cstdlib>
 #include <atomic>
 #include <bit>
+#include <cstdlib>
 #include <cstring>
+#include <memory>
 #include <new>
 #include <string>
 #include <utility>
@@ -64,12 +65,12 @@ bool compressShuffledChunk(const float* values, std::size_t count,
       unsigned char* to = shuffled.data() + b * count;
       for (std::size_t i = 0; i < count; ++i) to[i] = in[i * sizeof(float) + b];
     }
-    libdeflate_compressor* compressor = libdeflate_alloc_compressor(kGrdDeflateLevel);
+    const std::unique_ptr<libdeflate_compressor, void (*)(libdeflate_compressor*)> compressor(
+        libdeflate_alloc_compressor(kGrdDeflateLevel), libdeflate_free_compressor);
     if (compressor == nullptr) return false;
-    out.resize(libdeflate_zlib_compress_bound(compressor, bytes));
+    out.resize(libdeflate_zlib_compress_bound(compressor.get(), bytes));
     const std::size_t size =
-        libdeflate_zlib_compress(compressor, shuffled.data(), bytes, out.data(), out.size());
-    libdeflate_free_compressor(compressor);
+        libdeflate_zlib_compress(compressor.get(), shuffled.data(), bytes, out.data(), out.size());
     out.resize(size);
     return size > 0;
   } catch (const std::bad_alloc&) {
