@@ -14,9 +14,9 @@ ThreadShare shareThreads(int threads, long long layerCount) {
   layerCount = std::max(layerCount, 1LL);
   // With `layers` layer threads the pass takes ceil(layerCount / layers)
   // rounds, each as long as a layer on `rows` threads. A layer has a part that
-  // one thread does (copies, count table, smoothing, write-back), taken as a
-  // tenth of it. The share with the shortest pass wins, and of equal ones that
-  // with more layer threads.
+  // one thread does (the estimators' copy, smoothing), taken as a tenth of it.
+  // The share with the shortest pass wins, and of equal ones that with more
+  // layer threads.
   constexpr double kSerialPart = 0.1;
   ThreadShare best;
   double bestTime = static_cast<double>(layerCount);  // one thread: every layer in turn
