@@ -213,6 +213,17 @@ void receive(void* data, int count, MPI_Datatype type, int from, int tag, MPI_Co
   waitFor(request, true);
 }
 
+// Calls move(first, n) for the pieces of count floats that one message can take.
+template <typename Move>
+void inPieces(std::size_t count, const Move& move) {
+  std::size_t done = 0;
+  do {
+    const std::size_t n = count - done < kPiece ? count - done : kPiece;
+    move(done, static_cast<int>(n));
+    done += n;
+  } while (done < count);
+}
+
 }  // namespace
 #endif
 
@@ -272,12 +283,9 @@ void ranksSendFloats(const float* data, std::size_t count, int to, int tag) {
 #ifdef KARNET_WITH_MPI
   // Sent from a copy that outlives a send given up at an end.
   outgoingFloats.assign(data, data + count);
-  std::size_t done = 0;
-  do {
-    const std::size_t n = count - done < kPiece ? count - done : kPiece;
-    send(outgoingFloats.data() + done, static_cast<int>(n), MPI_FLOAT, to, tag, MPI_COMM_WORLD);
-    done += n;
-  } while (done < count);
+  inPieces(count, [to, tag](std::size_t first, int n) {
+    send(outgoingFloats.data() + first, n, MPI_FLOAT, to, tag, MPI_COMM_WORLD);
+  });
 #else
   (void)data;
   (void)count;
@@ -288,12 +296,9 @@ void ranksSendFloats(const float* data, std::size_t count, int to, int tag) {
 
 void ranksReceiveFloats(float* data, std::size_t count, int from, int tag) {
 #ifdef KARNET_WITH_MPI
-  std::size_t done = 0;
-  do {
-    const std::size_t n = count - done < kPiece ? count - done : kPiece;
-    receive(data + done, static_cast<int>(n), MPI_FLOAT, from, tag, MPI_COMM_WORLD);
-    done += n;
-  } while (done < count);
+  inPieces(count, [data, from, tag](std::size_t first, int n) {
+    receive(data + first, n, MPI_FLOAT, from, tag, MPI_COMM_WORLD);
+  });
 #else
   (void)data;
   (void)count;
