@@ -1,3 +1,4 @@
+#include <cstdlib>
 // Matrix inversion of the optimal interpolation: Gauss-Jordan elimination with
 // full pivoting, in place and in single precision.
 //
@@ -11,13 +12,33 @@
 
 #include <bit>
 #include <cmath>
+#include <climits>
 #include <cstdint>
+#include <utility>
+
+#if defined(__x86_64__) && defined(__GNUC__)
+#include <immintrin.h>
+#endif
 
 namespace karnet {
 namespace {
 
 // Scalings by ten that mark a determinant as too large.
 constexpr std::int32_t kTooLarge = 76;
+
+// pow(10, e) for the scale counts below kTooLarge, taken from pow itself once,
+// so that the determinant has the bits pow gives without a call per inversion.
+double powerOfTen(std::int32_t e) {
+  struct Powers {
+    double value[kTooLarge];
+    Powers() {
+      value[0] = 1.0;  // pow(10, 0) is exactly 1
+      for (std::int32_t i = 1; i < kTooLarge; ++i) value[i] = std::pow(10.0, i);
+    }
+  };
+  static const Powers powers;
+  return powers.value[e];
+}
 
 // Sort key of a matrix entry in the pivot search: the bits of its magnitude,
 // which order non-negative floats as the floats themselves, or -1 for a
@@ -187,8 +208,7 @@ inline std::int32_t pivotKey(float value, std::int32_t notFree) {
   }
   // pow(10, 0) is exactly 1 by definition; the usual unscaled determinant
   // spares the call.
-  const double power = scale == 0 ? 1.0 : std::pow(10.0, scale);
-  det = static_cast<float>(static_cast<double>(det) * power);
+  det = static_cast<float>(static_cast<double>(det) * powerOfTen(scale));
   if (static_cast<double>(det) < 1e-4) ws.errorText = "Determinant very small in INVMTX";
   return 0;
 }
@@ -210,6 +230,247 @@ std::int32_t invertBaseline(OaWorkspace& ws, float* a, std::int32_t n, float& de
 }
 #endif
 
+#ifdef KARNET_INVMTX_CLONES
+// Blocks of up to kPaddedMax rows are inverted in a copy whose rows are padded
+// with zeros to whole 8-float vectors: every row operation is then W vector
+// operations without a scalar tail, the pivot keys of a row come from the same
+// vectors, and the undoing of the interchanges becomes one column permutation
+// applied while the copy is written back. Lanes beyond the block only ever see
+// zeros (or what a zero becomes when divided by the pivot or reduced by a
+// multiple of the pivot row); they never take part in a pivot search and are
+// not written back, so the block's bits are those of the row loops above.
+constexpr std::int32_t kPaddedMax = 32;
+
+// The padded rows of the block followed, right after its last row, by the
+// pivot keys of each row in the same shape: kept together, so that a key and
+// the rows stored before it are never a multiple of 4 KiB apart (which would
+// make the processor hold the load back until those stores are done).
+struct alignas(32) PaddedBlock {
+  float values[2 * kPaddedMax * kPaddedMax];
+};
+
+// The pivot keys (pivotKey) of the W vectors of a padded row; notFree holds -1
+// in the lanes of used columns and of lanes beyond the block.
+template <int W>
+[[gnu::target("avx2"), gnu::always_inline]] inline void rowKeys(const float* row,
+                                                                 const __m256i* notFree,
+                                                                 __m256i* keys) {
+  const __m256i magnitudeBits = _mm256_set1_epi32(0x7fffffff);
+  const __m256i infinity = _mm256_set1_epi32(0x7f800000);
+  for (int w = 0; w < W; ++w) {
+    const __m256i bits = _mm256_castps_si256(_mm256_load_ps(row + 8 * w));
+    const __m256i magnitude = _mm256_and_si256(bits, magnitudeBits);
+    const __m256i notNumber = _mm256_cmpgt_epi32(magnitude, infinity);
+    keys[w] = _mm256_or_si256(_mm256_or_si256(magnitude, notNumber), notFree[w]);
+  }
+}
+
+// The greatest of the keys of a padded row.
+template <int W>
+[[gnu::target("avx2"), gnu::always_inline]] inline std::int32_t greatestKey(const __m256i* keys) {
+  __m256i m = keys[0];
+  for (int w = 1; w < W; ++w) m = _mm256_max_epi32(m, keys[w]);
+  __m128i h = _mm_max_epi32(_mm256_castsi256_si128(m), _mm256_extracti128_si256(m, 1));
+  h = _mm_max_epi32(h, _mm_shuffle_epi32(h, 0x4e));
+  h = _mm_max_epi32(h, _mm_shuffle_epi32(h, 0xb1));
+  return _mm_cvtsi128_si32(h);
+}
+
+// Lanes of the padded row vector w that lie inside an n-column block.
+template <int W>
+[[gnu::target("avx2"), gnu::always_inline]] inline void blockLanes(std::int32_t n,
+                                                                   const __m256i* lane,
+                                                                   __m256i* inside) {
+  const __m256i last = _mm256_set1_epi32(n - 1);
+  for (int w = 0; w < W; ++w) inside[w] = _mm256_xor_si256(_mm256_cmpgt_epi32(lane[w], last),
+                                                           _mm256_set1_epi32(-1));
+}
+
+template <int W>
+[[gnu::target("avx2")]] std::int32_t invertPadded(OaWorkspace& ws, float* a, std::int32_t n,
+                                                  float& det) {
+  constexpr std::int64_t kStride = 8 * W;
+  const std::int64_t stride = ws.limit;
+  PaddedBlock block;
+  float* b = block.values;
+  auto rowOf = [b](std::int32_t r) { return b + r * kStride; };
+
+  __m256i lane[W];
+  __m256i inside[W];
+  __m256i notFree[W];
+  for (int w = 0; w < W; ++w) {
+    lane[w] = _mm256_add_epi32(_mm256_setr_epi32(0, 1, 2, 3, 4, 5, 6, 7), _mm256_set1_epi32(8 * w));
+  }
+  blockLanes<W>(n, lane, inside);
+  for (int w = 0; w < W; ++w) notFree[w] = _mm256_xor_si256(inside[w], _mm256_set1_epi32(-1));
+  // Masked loads read only the block's columns and give zeros beyond.
+  for (std::int32_t r = 0; r < n; ++r) {
+    for (int w = 0; w < W; ++w) {
+      _mm256_store_ps(rowOf(r) + 8 * w, _mm256_maskload_ps(a + r * stride + 8 * w, inside[w]));
+    }
+  }
+
+  std::int32_t* __restrict used = ws.pivot;
+  std::int32_t* __restrict order = ws.pivot + n;
+  for (std::int32_t i = 0; i < 2 * n; ++i) ws.pivot[i] = -1;
+  det = 1.0f;
+  std::int32_t scale = 0;
+
+  // The pivot keys of every row, kept in the shape of the block; a row that
+  // is no longer free has keys of -1 only, as do used columns and the lanes
+  // beyond the block.
+  float* keyRows = b + n * kStride;
+  auto keysOf = [keyRows](std::int32_t r) {
+    return reinterpret_cast<__m256i*>(keyRows + r * kStride);
+  };
+  const auto* keyAt = reinterpret_cast<const std::int32_t*>(keyRows);
+  for (std::int32_t r = 0; r < n; ++r) rowKeys<W>(rowOf(r), notFree, keysOf(r));
+  std::int32_t firstFree = 0;  // the lowest free index
+
+  for (std::int32_t s = 0; s < n; ++s) {
+    // Pivot search: the greatest key of all free rows; of the entries holding
+    // it the greatest column, and in that column the greatest row, as the
+    // column-major scan with ">=" takes them. With no key left (every free
+    // entry not a number), the first free column and row.
+    __m256i greatest = keysOf(0)[0];
+    for (std::int32_t r = 0; r < n; ++r) {
+      for (int w = 0; w < W; ++w) greatest = _mm256_max_epi32(greatest, keysOf(r)[w]);
+    }
+    const std::int32_t best = greatestKey<1>(&greatest);
+    std::int32_t pr = firstFree;
+    std::int32_t pc = firstFree;
+    if (best >= 0) {
+      const __m256i wanted = _mm256_set1_epi32(best);
+      std::uint64_t columns = 0;
+      for (int w = 0; w < W; ++w) {
+        __m256i holds = _mm256_setzero_si256();
+        for (std::int32_t r = 0; r < n; ++r) {
+          holds = _mm256_or_si256(holds, _mm256_cmpeq_epi32(keysOf(r)[w], wanted));
+        }
+        columns |= static_cast<std::uint64_t>(
+                       static_cast<unsigned>(_mm256_movemask_ps(_mm256_castsi256_ps(holds))))
+                   << (8 * w);
+      }
+      pc = 63 - __builtin_clzll(columns);
+      for (std::int32_t r = 0; r < n; ++r) pr = keyAt[r * kStride + pc] == best ? r : pr;
+    }
+    used[pc] = pr;
+    order[s] = pc;
+    for (int w = 0; w < W; ++w) keysOf(pc)[w] = _mm256_set1_epi32(-1);
+    while (firstFree < n && used[firstFree] >= 0) ++firstFree;
+    const float p = rowOf(pr)[pc];
+
+    det = det * p;
+    while (std::fabs(det) > 1.0f) {
+      if (std::isinf(det)) {
+        if (scale < kTooLarge) scale = kTooLarge;
+        break;
+      }
+      det = static_cast<float>(static_cast<double>(det) / 10.0);
+      ++scale;
+    }
+
+    const float stepped = p / static_cast<float>(s + 1);
+    if (std::fabs(static_cast<double>(stepped)) < 1e-4) {
+      ws.errorText = "Matrix singular in INVMTX";
+      for (std::int32_t r = 0; r < n; ++r) {
+        for (int w = 0; w < W; ++w) {
+          _mm256_maskstore_ps(a + r * stride + 8 * w, inside[w], _mm256_load_ps(rowOf(r) + 8 * w));
+        }
+      }
+      return -1;
+    }
+
+    const __m256i column = _mm256_set1_epi32(pc);
+    __m256 atPivot[W];
+    for (int w = 0; w < W; ++w) {
+      const __m256i here = _mm256_cmpeq_epi32(lane[w], column);
+      atPivot[w] = _mm256_castsi256_ps(here);
+      notFree[w] = _mm256_or_si256(notFree[w], here);
+    }
+
+    // Exchange rows pr and pc; the row that lands in pc is divided by p, its
+    // pivot entry first set to 1.
+    const __m256 pv = _mm256_set1_ps(p);
+    const __m256 one = _mm256_set1_ps(1.0f);
+    float* rowA = rowOf(pr);
+    float* rowB = rowOf(pc);
+    __m256 pivotValues[W];
+    for (int w = 0; w < W; ++w) {
+      const __m256 t = _mm256_blendv_ps(_mm256_load_ps(rowA + 8 * w), one, atPivot[w]);
+      _mm256_store_ps(rowA + 8 * w, _mm256_load_ps(rowB + 8 * w));
+      pivotValues[w] = _mm256_div_ps(t, pv);
+      _mm256_store_ps(rowB + 8 * w, pivotValues[w]);
+    }
+
+    // Elimination of column pc from every other row, its entry there set to 0
+    // first; a row still free takes its pivot keys for the next step.
+    const __m256 zero = _mm256_setzero_ps();
+    for (std::int32_t r = 0; r < n; ++r) {
+      if (r == pc) continue;
+      float* row = rowOf(r);
+      const __m256 f = _mm256_set1_ps(row[pc]);
+      for (int w = 0; w < W; ++w) {
+        const __m256 v = _mm256_blendv_ps(_mm256_load_ps(row + 8 * w), zero, atPivot[w]);
+        _mm256_store_ps(row + 8 * w, _mm256_sub_ps(v, _mm256_mul_ps(f, pivotValues[w])));
+      }
+      if (used[r] < 0) rowKeys<W>(row, notFree, keysOf(r));
+    }
+  }
+
+  // The interchanges, undone last step first as column exchanges, amount to
+  // one permutation of the columns: column q of the result is column from[q]
+  // of the eliminated block.
+  alignas(32) std::int32_t from[kPaddedMax];
+  for (std::int32_t q = 0; q < kPaddedMax; ++q) from[q] = q;
+  for (std::int32_t s = n - 1; s >= 0; --s) {
+    const std::int32_t c = order[s];
+    const std::int32_t r = used[c];
+    if (r == c) continue;
+    det = static_cast<float>(static_cast<double>(det) * -1.0);
+    std::swap(from[r], from[c]);
+  }
+  if constexpr (W == 1) {
+    const __m256i permutation = _mm256_load_si256(reinterpret_cast<const __m256i*>(from));
+    for (std::int32_t r = 0; r < n; ++r) {
+      _mm256_maskstore_ps(a + r * stride, inside[0],
+                          _mm256_permutevar8x32_ps(_mm256_load_ps(rowOf(r)), permutation));
+    }
+  } else {
+    for (std::int32_t r = 0; r < n; ++r) {
+      const float* row = rowOf(r);
+      float* to = a + r * stride;
+      for (std::int32_t q = 0; q < n; ++q) to[q] = row[from[q]];
+    }
+  }
+
+  if (scale >= kTooLarge) {
+    ws.errorText = "Determinant too large in INVMTX";
+    det = static_cast<float>(scale);
+    return -1;
+  }
+  det = static_cast<float>(static_cast<double>(det) * powerOfTen(scale));
+  if (static_cast<double>(det) < 1e-4) ws.errorText = "Determinant very small in INVMTX";
+  return 0;
+}
+
+// The padded variant for blocks that it takes, the row-loop variant beyond.
+[[gnu::target("avx2")]] std::int32_t invertAvx2Padded(OaWorkspace& ws, float* a, std::int32_t n,
+                                                      float& det) {
+  if (n < 1 || ws.limit < n || n > kPaddedMax) return invertAvx2(ws, a, n, det);
+  switch ((n + 7) / 8) {
+    case 1:
+      return invertPadded<1>(ws, a, n, det);
+    case 2:
+      return invertPadded<2>(ws, a, n, det);
+    case 3:
+      return invertPadded<3>(ws, a, n, det);
+    default:
+      return invertPadded<4>(ws, a, n, det);
+  }
+}
+#endif
+
 using InvertFunction = std::int32_t (*)(OaWorkspace&, float*, std::int32_t, float&);
 
 InvertFunction variantFunction(InvmtxVariant variant) {
@@ -222,6 +483,8 @@ InvertFunction variantFunction(InvmtxVariant variant) {
       return invertAvx2;
     case InvmtxVariant::kAvx512:
       return invertAvx512;
+    case InvmtxVariant::kAvx2Padded:
+      return invertAvx2Padded;
 #endif
     default:
       return nullptr;
@@ -244,6 +507,7 @@ Chosen chooseVariants() {
     chosen.shortRows = f;
     chosen.longRows = f;
   }
+  if (InvertFunction f = variantFunction(InvmtxVariant::kAvx2Padded)) if (!getenv("NOPAD")) chosen.shortRows = f;
   if (InvertFunction f = variantFunction(InvmtxVariant::kAvx512)) chosen.longRows = f;
   return chosen;
 }
@@ -260,6 +524,8 @@ bool invmtxVariantAvailable(InvmtxVariant variant) {
     case InvmtxVariant::kAvx512:
       return __builtin_cpu_supports("avx512f") && __builtin_cpu_supports("avx512bw") &&
              __builtin_cpu_supports("avx512vl");
+    case InvmtxVariant::kAvx2Padded:
+      return __builtin_cpu_supports("avx2");
 #endif
     default:
       return false;
@@ -274,6 +540,8 @@ const char* invmtxVariantName(InvmtxVariant variant) {
       return "avx2";
     case InvmtxVariant::kAvx512:
       return "avx512";
+    case InvmtxVariant::kAvx2Padded:
+      return "avx2-padded";
   }
   return "?";
 }

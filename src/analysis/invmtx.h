@@ -24,9 +24,12 @@ std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det);
 
 // The compiled variants of INVMTX, one per instruction set; all give the same
 // bits. kBaseline runs everywhere.
-enum class InvmtxVariant { kBaseline, kAvx2, kAvx512 };
-inline constexpr InvmtxVariant kInvmtxVariants[] = {InvmtxVariant::kBaseline,
-                                                    InvmtxVariant::kAvx2, InvmtxVariant::kAvx512};
+// kAvx2Padded works on a copy of the block with rows padded to whole vectors,
+// for blocks of up to 32 rows (beyond, it is kAvx2).
+enum class InvmtxVariant { kBaseline, kAvx2, kAvx512, kAvx2Padded };
+inline constexpr InvmtxVariant kInvmtxVariants[] = {
+    InvmtxVariant::kBaseline, InvmtxVariant::kAvx2, InvmtxVariant::kAvx512,
+    InvmtxVariant::kAvx2Padded};
 
 // Whether this build holds the variant and the processor can run it.
 bool invmtxVariantAvailable(InvmtxVariant variant);

@@ -65,8 +65,8 @@ void recordErrorVariance(FloatGrid3D& field, float e, std::int64_t p, std::int64
 }
 
 // The storage of one thread's estimates: the candidate and chosen-cell arrays
-// and sort keys, the matrix and the pivot records, the selection's column
-// cursors and row reaches (carried from node to node along the thread's own
+// and sort keys, the matrix and the pivot records, the selection's window,
+// column cursors and row reaches (carried from node to node along the thread's own
 // walk), and the inverse it last computed. It works on a copy of the layer's
 // workspace whose per-node arrays point here; the layer's data cells, column
 // index and correlation table stay shared and are only read.
@@ -77,7 +77,10 @@ class NodeScratch {
         candIndex_(entries(layer.dataCapacity)),
         candCorr_(entries(layer.dataCapacity)),
         candKey_(entries(layer.dataCapacity)),
+        windowCell_(entries(layer.dataCapacity)),
+        windowLast_(entries(layer.dataCapacity)),
         columnCursor_(entries(layer.columnCount)),
+        columnEnter_(entries(layer.columnCount)),
         rowReach_(entries(layer.columnCount)),
         selIndex_(entries(layer.limit)),
         selX_(entries(layer.limit)),
@@ -91,7 +94,10 @@ class NodeScratch {
     ws.candCorr = candCorr_.data();
     ws.candKey = candKey_.data();
     // Cursors and row reaches start afresh on every thread.
+    ws.windowCell = windowCell_.data();
+    ws.windowLast = windowLast_.data();
     if (layer.columnCursor != nullptr) ws.columnCursor = columnCursor_.data();
+    if (layer.columnEnter != nullptr) ws.columnEnter = columnEnter_.data();
     if (layer.rowReach != nullptr) ws.rowReach = rowReach_.data();
     ws.cursorJ = -1;
     ws.cursorK = 0;
@@ -118,7 +124,10 @@ class NodeScratch {
   std::vector<std::int32_t> candIndex_;
   std::vector<float> candCorr_;
   std::vector<std::uint64_t> candKey_;
+  std::vector<std::int32_t> windowCell_;
+  std::vector<std::int32_t> windowLast_;
   std::vector<std::int32_t> columnCursor_;
+  std::vector<std::int32_t> columnEnter_;
   std::vector<std::int32_t> rowReach_;
   std::vector<std::int32_t> selIndex_;
   std::vector<float> selX_, selY_, selValue_, selCorr_;

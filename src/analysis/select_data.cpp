@@ -3,7 +3,9 @@
 
 #include <algorithm>
 #include <bit>
+#include <climits>
 #include <cmath>
+#include <cstdint>
 
 #include "analysis/correlation.h"
 
@@ -64,6 +66,101 @@ inline void consider(OaWorkspace& ws, std::int32_t i, float nodeX, float nodeY, 
   ws.candIndex[count] = i;
   ws.candCorr[count] = tabledCorrelation(d2, ws);
   ++count;
+}
+
+// The window of node (j, k) over columns xFirst .. xLast: in column x the
+// cells of rows k - rowReach[|x - j|] .. k + rowReach[|x - j|], which are the
+// cells the radius test can pass. Cell positions are whole numbers below 2^24
+// (the column index holds no others), so the bounds are exact integers.
+std::int32_t windowRows(const OaWorkspace& ws, std::int32_t j, std::int64_t x) {
+  return ws.rowReach[x < j ? j - x : x - j];
+}
+
+// Where column x's cell at cursor i comes into the window (the node row at
+// which it does), or INT32_MAX when the column has no cell left above.
+std::int32_t enterRow(const OaWorkspace& ws, std::int64_t x, std::int32_t i, std::int32_t rows) {
+  if (i >= ws.columnStart[x + 1]) return INT32_MAX;
+  return static_cast<std::int32_t>(ws.dataY[i]) - rows;
+}
+
+// Fills the window of node (j, k) from the column index, column by column.
+void openWindow(OaWorkspace& ws, std::int32_t j, std::int32_t k, std::int64_t xFirst,
+                std::int64_t xLast) {
+  std::int32_t count = 0;
+  std::int32_t nextEnter = INT32_MAX;
+  for (std::int64_t x = xFirst; x <= xLast; ++x) {
+    const std::int32_t rows = windowRows(ws, j, x);
+    const std::int64_t yFirst = std::int64_t{k} - rows;
+    const std::int64_t yLast = std::int64_t{k} + rows;
+    const std::int32_t end = ws.columnStart[x + 1];
+    const float* first = std::lower_bound(
+        ws.dataY + ws.columnStart[x], ws.dataY + end, yFirst,
+        [](float y, std::int64_t bound) { return static_cast<std::int64_t>(y) < bound; });
+    auto i = static_cast<std::int32_t>(first - ws.dataY);
+    for (; i < end && static_cast<std::int64_t>(ws.dataY[i]) <= yLast; ++i) {
+      ws.windowCell[count] = i;
+      ws.windowLast[count] = static_cast<std::int32_t>(ws.dataY[i]) + rows;
+      ++count;
+    }
+    ws.columnCursor[x] = i;
+    ws.columnEnter[x] = enterRow(ws, x, i, rows);
+    nextEnter = std::min(nextEnter, ws.columnEnter[x]);
+  }
+  ws.windowCount = count;
+  ws.nextEnter = nextEnter;
+}
+
+// Moves the window of node (j, cursorK) up to node (j, k), k >= cursorK: the
+// cells whose last row has passed leave, the cells of each column that the
+// window has reached come in (unless the window has passed them too), and the
+// window stays in collection order.
+void slideWindow(OaWorkspace& ws, std::int32_t j, std::int32_t k, std::int64_t xFirst,
+                 std::int64_t xLast) {
+  std::int32_t kept = 0;
+  for (std::int32_t p = 0; p < ws.windowCount; ++p) {
+    ws.windowCell[kept] = ws.windowCell[p];
+    ws.windowLast[kept] = ws.windowLast[p];
+    kept += ws.windowLast[p] >= k ? 1 : 0;
+  }
+  ws.windowCount = kept;
+  if (ws.nextEnter > k) return;
+
+  // The cells coming in, in column order (so ascending), gathered in
+  // candIndex, which is free until the candidates are taken.
+  std::int32_t* incoming = ws.candIndex;
+  std::int32_t added = 0;
+  std::int32_t nextEnter = INT32_MAX;
+  for (std::int64_t x = xFirst; x <= xLast; ++x) {
+    if (ws.columnEnter[x] <= k) {
+      const std::int32_t rows = windowRows(ws, j, x);
+      const std::int32_t end = ws.columnStart[x + 1];
+      std::int32_t i = ws.columnCursor[x];
+      for (; i < end && static_cast<std::int64_t>(ws.dataY[i]) <= std::int64_t{k} + rows; ++i) {
+        if (static_cast<std::int64_t>(ws.dataY[i]) + rows >= k) incoming[added++] = i;
+      }
+      ws.columnCursor[x] = i;
+      ws.columnEnter[x] = enterRow(ws, x, i, rows);
+    }
+    nextEnter = std::min(nextEnter, ws.columnEnter[x]);
+  }
+  ws.nextEnter = nextEnter;
+
+  // Merge, from the back, the incoming cells into the window.
+  std::int32_t p = ws.windowCount - 1;
+  std::int32_t out = ws.windowCount + added - 1;
+  for (std::int32_t q = added - 1; q >= 0; --out) {
+    if (p >= 0 && ws.windowCell[p] > incoming[q]) {
+      ws.windowCell[out] = ws.windowCell[p];
+      ws.windowLast[out] = ws.windowLast[p];
+      --p;
+    } else {
+      const std::int32_t i = incoming[q--];
+      ws.windowCell[out] = i;
+      ws.windowLast[out] = static_cast<std::int32_t>(ws.dataY[i]) +
+                           windowRows(ws, j, static_cast<std::int64_t>(ws.dataX[i]));
+    }
+  }
+  ws.windowCount += added;
 }
 
 // The exchange sort of sortByCorrelation on one array of 64-bit keys instead
@@ -157,29 +254,15 @@ std::int32_t selectData(OaWorkspace& ws, std::int32_t j, std::int32_t k,
         ws.rowReachRadius2 = radius2;
         ws.rowReachNodes = reach;
       }
-      // The cursors stand at each column's first cell at or above the window
-      // of an earlier node of this column (same radius, so the same columns);
-      // a later node's window starts no lower, so they only move up.
-      const bool resume = sameRadius && ws.cursorJ == j && ws.cursorK <= k;
+      if (sameRadius && ws.cursorJ == j && ws.cursorK <= k) {
+        slideWindow(ws, j, k, xFirst, xLast);
+      } else {
+        openWindow(ws, j, k, xFirst, xLast);
+      }
       ws.cursorJ = j;
       ws.cursorK = k;
-      for (std::int64_t x = xFirst; x <= xLast; ++x) {
-        const std::int64_t rows = rowReach[x < j ? j - x : x - j];
-        const double yFirst = static_cast<double>(std::int64_t{k} - rows);
-        const double yLast = static_cast<double>(std::int64_t{k} + rows);
-        const std::int32_t end = ws.columnStart[x + 1];
-        std::int32_t i = ws.columnCursor[x];
-        if (!resume) {
-          const float* first = std::lower_bound(
-              ws.dataY + ws.columnStart[x], ws.dataY + end, yFirst,
-              [](float y, double bound) { return static_cast<double>(y) < bound; });
-          i = static_cast<std::int32_t>(first - ws.dataY);
-        }
-        while (i < end && static_cast<double>(ws.dataY[i]) < yFirst) ++i;
-        ws.columnCursor[x] = i;
-        for (; i < end && !(static_cast<double>(ws.dataY[i]) > yLast); ++i) {
-          consider(ws, i, nodeX, nodeY, radius2, count);
-        }
+      for (std::int32_t p = 0; p < ws.windowCount; ++p) {
+        consider(ws, ws.windowCell[p], nodeX, nodeY, radius2, count);
       }
     }
   } else {

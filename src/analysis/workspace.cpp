@@ -62,6 +62,8 @@ void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::i
   ws.candIndex = allocateEntries<std::int32_t>(data);
   ws.candCorr = allocateEntries<float>(data);
   ws.candKey = allocateEntries<std::uint64_t>(data);
+  ws.windowCell = allocateEntries<std::int32_t>(data);
+  ws.windowLast = allocateEntries<std::int32_t>(data);
 
   ws.selIndex = allocateEntries<std::int32_t>(limit);
   ws.selX = allocateEntries<float>(limit);
@@ -88,6 +90,7 @@ void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::i
   ws.columnCount = 0;
   ws.columnStart = nullptr;
   ws.columnCursor = nullptr;
+  ws.columnEnter = nullptr;
   ws.cursorJ = -1;
   ws.rowReach = nullptr;
   ws.rowReachCount = 0;
@@ -97,6 +100,7 @@ void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::i
 void workspaceIndexColumns(OaWorkspace& ws, std::int32_t nj) {
   release(ws.columnStart);
   release(ws.columnCursor);
+  release(ws.columnEnter);
   release(ws.rowReach);
   ws.columnCount = 0;
   ws.cursorJ = -1;
@@ -125,6 +129,7 @@ void workspaceIndexColumns(OaWorkspace& ws, std::int32_t nj) {
   }
   ws.columnStart[nj] = i;
   ws.columnCursor = allocateEntries<std::int32_t>(nj);
+  ws.columnEnter = allocateEntries<std::int32_t>(nj);
   ws.rowReach = allocateEntries<std::int32_t>(nj);
   ws.columnCount = nj;
 }
@@ -136,6 +141,8 @@ void workspaceRelease(OaWorkspace& ws) {
   release(ws.candIndex);
   release(ws.candCorr);
   release(ws.candKey);
+  release(ws.windowCell);
+  release(ws.windowLast);
   release(ws.selIndex);
   release(ws.selX);
   release(ws.selY);
@@ -147,6 +154,7 @@ void workspaceRelease(OaWorkspace& ws) {
   release(ws.corrTable);
   release(ws.columnStart);
   release(ws.columnCursor);
+  release(ws.columnEnter);
   release(ws.rowReach);
   ws.cursorJ = -1;
   ws.rowReachCount = 0;

@@ -69,12 +69,25 @@ struct OaWorkspace {
   std::int32_t columnCount = 0;
   std::int32_t* columnStart = nullptr;
 
-  // Where the selection's window of each column began at the latest node, so
-  // that the next node of the same column (the layer pass's order: k rising
-  // within a column j) moves each start forward instead of searching it
-  // again. Valid for node column cursorJ and rows from cursorK on; any other
-  // node starts afresh. columnCount entries, with the column index.
+  // The selection's window as it stood at the latest node (cursorJ, cursorK),
+  // so that the next node of the same column (the layer pass's order: k rising
+  // within a column j) only drops the cells that fell out below and takes in
+  // those that came in above, instead of scanning every column again. Any
+  // other node starts afresh.
+  //   windowCell[0 .. windowCount-1]: the cells inside the window, ascending
+  //     (so in collection order); windowLast: the last node row k at which
+  //     each of them is still inside.
+  //   columnCursor[x]: the first cell of column x above the window;
+  //     columnEnter[x]: the node row k at which that cell comes in (INT32_MAX:
+  //     none); nextEnter: the least of them.
+  // windowCell and windowLast have dataCapacity entries, columnCursor and
+  // columnEnter columnCount.
+  std::int32_t* windowCell = nullptr;
+  std::int32_t* windowLast = nullptr;
+  std::int32_t windowCount = 0;
   std::int32_t* columnCursor = nullptr;
+  std::int32_t* columnEnter = nullptr;
+  std::int32_t nextEnter = 0;
   std::int32_t cursorJ = -1;
   std::int32_t cursorK = 0;
 

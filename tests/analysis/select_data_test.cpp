@@ -225,6 +225,10 @@ TEST(SelectData, EveryVisitingOrderMatchesTheLiteralSelection) {
       for (std::int32_t k = 0; k < nk; ++k) nodes.emplace_back(j, k);
     for (std::int32_t k = 0; k < nk; ++k)  // row by row
       for (std::int32_t j = 0; j < nj; ++j) nodes.emplace_back(j, k);
+    for (std::int32_t j = 0; j < nj; ++j)  // up each column with gaps (dry nodes)
+      for (std::int32_t k = static_cast<std::int32_t>(random() % 3); k < nk;
+           k += 1 + static_cast<std::int32_t>(random() % (trial % 2 == 0 ? 3 : 9)))
+        nodes.emplace_back(j, k);
     for (int i = 0; i < 100; ++i)  // anywhere, rows going down as well
       nodes.emplace_back(random() % nj, random() % nk);
     for (const auto& [j, k] : nodes) {
