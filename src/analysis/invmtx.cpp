@@ -239,7 +239,7 @@ std::int32_t invertBaseline(OaWorkspace& ws, float* a, std::int32_t n, float& de
 // zeros (or what a zero becomes when divided by the pivot or reduced by a
 // multiple of the pivot row); they never take part in a pivot search and are
 // not written back, so the block's bits are those of the row loops above.
-constexpr std::int32_t kPaddedMax = 32;
+constexpr std::int32_t kPaddedMax = 64;
 
 // The padded rows of the block followed, right after its last row, by the
 // pivot keys of each row in the same shape: kept together, so that a key and
@@ -263,6 +263,16 @@ template <int W>
     const __m256i notNumber = _mm256_cmpgt_epi32(magnitude, infinity);
     keys[w] = _mm256_or_si256(_mm256_or_si256(magnitude, notNumber), notFree[w]);
   }
+}
+
+// Stores the keys of a padded row and raises the lane-wise greatest keys to them.
+template <int W>
+[[gnu::target("avx2"), gnu::always_inline]] inline void takeKeys(const float* row,
+                                                                 const __m256i* notFree,
+                                                                 __m256i* keys,
+                                                                 __m256i* greatest) {
+  rowKeys<W>(row, notFree, keys);
+  for (int w = 0; w < W; ++w) greatest[w] = _mm256_max_epi32(greatest[w], keys[w]);
 }
 
 // The greatest of the keys of a padded row.
@@ -324,7 +334,10 @@ template <int W>
     return reinterpret_cast<__m256i*>(keyRows + r * kStride);
   };
   const auto* keyAt = reinterpret_cast<const std::int32_t*>(keyRows);
-  for (std::int32_t r = 0; r < n; ++r) rowKeys<W>(rowOf(r), notFree, keysOf(r));
+  // greatest[w]: lane by lane, the greatest key of the free rows.
+  __m256i greatest[W];
+  for (int w = 0; w < W; ++w) greatest[w] = _mm256_set1_epi32(-1);
+  for (std::int32_t r = 0; r < n; ++r) takeKeys<W>(rowOf(r), notFree, keysOf(r), greatest);
   std::int32_t firstFree = 0;  // the lowest free index
 
   for (std::int32_t s = 0; s < n; ++s) {
@@ -332,21 +345,14 @@ template <int W>
     // it the greatest column, and in that column the greatest row, as the
     // column-major scan with ">=" takes them. With no key left (every free
     // entry not a number), the first free column and row.
-    __m256i greatest = keysOf(0)[0];
-    for (std::int32_t r = 0; r < n; ++r) {
-      for (int w = 0; w < W; ++w) greatest = _mm256_max_epi32(greatest, keysOf(r)[w]);
-    }
-    const std::int32_t best = greatestKey<1>(&greatest);
+    const std::int32_t best = greatestKey<W>(greatest);
     std::int32_t pr = firstFree;
     std::int32_t pc = firstFree;
     if (best >= 0) {
       const __m256i wanted = _mm256_set1_epi32(best);
       std::uint64_t columns = 0;
       for (int w = 0; w < W; ++w) {
-        __m256i holds = _mm256_setzero_si256();
-        for (std::int32_t r = 0; r < n; ++r) {
-          holds = _mm256_or_si256(holds, _mm256_cmpeq_epi32(keysOf(r)[w], wanted));
-        }
+        const __m256i holds = _mm256_cmpeq_epi32(greatest[w], wanted);
         columns |= static_cast<std::uint64_t>(
                        static_cast<unsigned>(_mm256_movemask_ps(_mm256_castsi256_ps(holds))))
                    << (8 * w);
@@ -354,6 +360,7 @@ template <int W>
       pc = 63 - __builtin_clzll(columns);
       for (std::int32_t r = 0; r < n; ++r) pr = keyAt[r * kStride + pc] == best ? r : pr;
     }
+    for (int w = 0; w < W; ++w) greatest[w] = _mm256_set1_epi32(-1);
     used[pc] = pr;
     order[s] = pc;
     for (int w = 0; w < W; ++w) keysOf(pc)[w] = _mm256_set1_epi32(-1);
@@ -414,7 +421,7 @@ template <int W>
         const __m256 v = _mm256_blendv_ps(_mm256_load_ps(row + 8 * w), zero, atPivot[w]);
         _mm256_store_ps(row + 8 * w, _mm256_sub_ps(v, _mm256_mul_ps(f, pivotValues[w])));
       }
-      if (used[r] < 0) rowKeys<W>(row, notFree, keysOf(r));
+      if (used[r] < 0) takeKeys<W>(row, notFree, keysOf(r), greatest);
     }
   }
 
@@ -465,8 +472,16 @@ template <int W>
       return invertPadded<2>(ws, a, n, det);
     case 3:
       return invertPadded<3>(ws, a, n, det);
-    default:
+    case 4:
       return invertPadded<4>(ws, a, n, det);
+    case 5:
+      return invertPadded<5>(ws, a, n, det);
+    case 6:
+      return invertPadded<6>(ws, a, n, det);
+    case 7:
+      return invertPadded<7>(ws, a, n, det);
+    default:
+      return invertPadded<8>(ws, a, n, det);
   }
 }
 #endif
@@ -492,9 +507,10 @@ InvertFunction variantFunction(InvmtxVariant variant) {
 }
 
 // The variant for blocks of up to kShortRows rows, and the one for larger
-// blocks. 512-bit rows only pay once they are long: on short ones the partial
-// vector at the end of each row costs more than the wider body saves.
-constexpr std::int32_t kShortRows = 32;
+// blocks: padded rows up to their limit; beyond, 512-bit rows, which only pay
+// once they are long (on short ones the partial vector at the end of each row
+// costs more than the wider body saves).
+constexpr std::int32_t kShortRows = 64;
 
 struct Chosen {
   InvertFunction shortRows = invertBaseline;

@@ -25,7 +25,7 @@ std::int32_t INVMTX(OaWorkspace& ws, float* a, std::int32_t n, float& det);
 // The compiled variants of INVMTX, one per instruction set; all give the same
 // bits. kBaseline runs everywhere.
 // kAvx2Padded works on a copy of the block with rows padded to whole vectors,
-// for blocks of up to 32 rows (beyond, it is kAvx2).
+// for blocks of up to 64 rows (beyond, it is kAvx2).
 enum class InvmtxVariant { kBaseline, kAvx2, kAvx512, kAvx2Padded };
 inline constexpr InvmtxVariant kInvmtxVariants[] = {
     InvmtxVariant::kBaseline, InvmtxVariant::kAvx2, InvmtxVariant::kAvx512,
