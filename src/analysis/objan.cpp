@@ -30,23 +30,57 @@ std::int32_t buildCorrelationMatrix(OaWorkspace& ws, std::int32_t m, const RunSe
   return INVMTX(ws, a, m, det) != 0 ? -1 : 0;
 }
 
+namespace {
+
+// Rows i .. i + R - 1 of a (stride `stride`, n columns): their entry sums and
+// their products with values, each a sum over j rising in single precision.
+// The rows of a block are summed side by side, each in its own order, so the
+// chains of additions overlap instead of waiting on one another.
+template <int R>
+inline void rowSumsAndProducts(const float* a, std::int64_t stride, const float* values,
+                               std::int32_t n, std::int32_t i, float* sums, float* products) {
+  float sum[R] = {};
+  float product[R] = {};
+  for (std::int32_t j = 0; j < n; ++j) {
+    const float v = values[j];
+    for (int r = 0; r < R; ++r) {
+      const float x = a[(i + r) * stride + j];
+      sum[r] = sum[r] + x;
+      product[r] = product[r] + x * v;
+    }
+  }
+  for (int r = 0; r < R; ++r) {
+    sums[r] = sum[r];
+    products[r] = product[r];
+  }
+}
+
+constexpr int kRowBlock = 4;
+
+// sums[i] and products[i] of rowSumsAndProducts for every row i < n.
+void allRowSumsAndProducts(const float* a, std::int64_t stride, const float* values,
+                           std::int32_t n, float* sums, float* products) {
+  std::int32_t i = 0;
+  for (; i + kRowBlock <= n; i += kRowBlock) {
+    rowSumsAndProducts<kRowBlock>(a, stride, values, n, i, sums + i, products + i);
+  }
+  for (; i < n; ++i) rowSumsAndProducts<1>(a, stride, values, n, i, sums + i, products + i);
+}
+
+}  // namespace
+
 void removeWeightedMean(const OaWorkspace& ws, const float* a, float* values, std::int32_t n,
                         float& mean, float& weightSum) {
-  const std::int64_t stride = ws.limit;
-  // Row by row, the row sum and row product are added to the totals in row
-  // order, as a sum over stored row results would be.
+  // The row sums and row products are added to the totals in row order, as a
+  // sum over stored row results would be.
+  float* rowSum = ws.rowSums;
+  float* rowDot = ws.rowProducts;
+  allRowSumsAndProducts(a, ws.limit, values, n, rowSum, rowDot);
   float total = 0.0f;
   float weighted = 0.0f;
   for (std::int32_t i = 0; i < n; ++i) {
-    const float* row = a + i * stride;
-    float rowSum = 0.0f;
-    float rowDot = 0.0f;
-    for (std::int32_t j = 0; j < n; ++j) {
-      rowSum = rowSum + row[j];
-      rowDot = rowDot + row[j] * values[j];
-    }
-    total = total + rowSum;
-    weighted = weighted + rowDot;
+    total = total + rowSum[i];
+    weighted = weighted + rowDot[i];
   }
   mean = weighted / total;
   weightSum = total;
@@ -71,28 +105,31 @@ std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSe
     ws.errorText = "No observational data in OBJAN";
     return -1;
   }
-  std::int32_t inverted = 0;
-  if (cache != nullptr && cache->holds(ws.selIndex, m)) {
-    inverted = cache->result;
-    ws.errorText = cache->errorText;
-  } else {
-    inverted = buildCorrelationMatrix(ws, m, settings);
-    if (cache != nullptr) cache->keep(ws.selIndex, m, inverted, ws.errorText);
-  }
-  if (inverted != 0) return -1;
-
   float mean = 0.0f;
-  float weightSum = 0.0f;
-  removeWeightedMean(ws, ws.matrix, ws.selValue, m, mean, weightSum);
-
-  const std::int64_t stride = ws.limit;
-  float sum = 0.0f;
-  for (std::int32_t i = 0; i < m; ++i) {
-    const float* row = ws.matrix + i * stride;
-    float s = 0.0f;
-    for (std::int32_t j = 0; j < m; ++j) s = s + row[j] * ws.selValue[j];
-    sum = ws.selCorr[i] * s + sum;
+  const float* products = ws.rowProducts;  // row i of the inverse times the values less the mean
+  if (cache != nullptr && cache->holds(ws.selIndex, m)) {
+    // The same cells have the same values: the mean and the row products of
+    // the kept inverse stand as they were.
+    ws.errorText = cache->errorText;
+    if (cache->result != 0) return -1;
+    mean = cache->mean;
+    for (std::int32_t i = 0; i < m; ++i) ws.selValue[i] = ws.selValue[i] - mean;
+    products = cache->products;
+  } else {
+    const std::int32_t inverted = buildCorrelationMatrix(ws, m, settings);
+    if (cache != nullptr) cache->keep(ws.selIndex, m, inverted, ws.errorText);
+    if (inverted != 0) return -1;
+    float weightSum = 0.0f;
+    removeWeightedMean(ws, ws.matrix, ws.selValue, m, mean, weightSum);
+    allRowSumsAndProducts(ws.matrix, ws.limit, ws.selValue, m, ws.rowSums, ws.rowProducts);
+    if (cache != nullptr) {
+      cache->mean = mean;
+      std::copy(ws.rowProducts, ws.rowProducts + m, cache->products);
+    }
   }
+
+  float sum = 0.0f;
+  for (std::int32_t i = 0; i < m; ++i) sum = ws.selCorr[i] * products[i] + sum;
   *estimate = mean + sum;
   return 0;
 }

@@ -16,6 +16,11 @@ struct InverseCache {
   std::int32_t count = -1;         // cells of the kept inverse; -1: none kept
   std::int32_t result = 0;         // what the inversion gave (0 or -1)
   const char* errorText = "";      // and the reason it left
+  // For a successful inverse, what the cells' values make of it (the same
+  // cells have the same values): their weighted mean and the products of the
+  // inverse's rows with the values less that mean.
+  float mean = 0.0f;
+  float* products = nullptr;  // room for limit values
 
   bool holds(const std::int32_t* cells, std::int32_t m) const;
   void keep(const std::int32_t* cells, std::int32_t m, std::int32_t inverted,
@@ -30,7 +35,8 @@ struct InverseCache {
 // naming the reason. ws.selValue is left with the mean removed.
 // With a cache, the matrix is not built and inverted again when the chosen
 // cells (ws.selIndex[0..m-1]) are those of the cache's inverse, which must
-// then still be in ws.matrix; the estimate is the same bit for bit.
+// then still be in ws.matrix, and the mean and row products are the kept
+// ones; the estimate is the same bit for bit.
 std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSettings& settings,
                    InverseCache* cache = nullptr);
 
@@ -42,6 +48,7 @@ std::int32_t buildCorrelationMatrix(OaWorkspace& ws, std::int32_t m, const RunSe
 // With a the inverted matrix (row stride ws.limit): mean = (sum of a's
 // row products with values) / (sum of all of a's n x n entries); subtracts the
 // mean from values[0..n-1] in place and hands back the mean and the entry sum.
+// Uses ws.rowSums and ws.rowProducts.
 void removeWeightedMean(const OaWorkspace& ws, const float* a, float* values, std::int32_t n,
                         float& mean, float& weightSum);
 

@@ -88,8 +88,11 @@ class NodeScratch {
         selValue_(entries(layer.limit)),
         selCorr_(entries(layer.limit)),
         matrix_(entries(std::int64_t{layer.limit} * layer.limit)),
+        rowSums_(entries(layer.limit)),
+        rowProducts_(entries(layer.limit)),
         pivot_(entries(oaPivotEntries(layer.limit))),
-        chosen_(entries(layer.limit)) {
+        chosen_(entries(layer.limit)),
+        kept_(entries(layer.limit)) {
     ws.candIndex = candIndex_.data();
     ws.candCorr = candCorr_.data();
     ws.candKey = candKey_.data();
@@ -108,8 +111,11 @@ class NodeScratch {
     ws.selValue = selValue_.data();
     ws.selCorr = selCorr_.data();
     ws.matrix = matrix_.data();
+    ws.rowSums = rowSums_.data();
+    ws.rowProducts = rowProducts_.data();
     ws.pivot = pivot_.data();
     inverse.chosen = chosen_.data();
+    inverse.products = kept_.data();
   }
   NodeScratch(const NodeScratch&) = delete;
   NodeScratch& operator=(const NodeScratch&) = delete;
@@ -132,8 +138,10 @@ class NodeScratch {
   std::vector<std::int32_t> selIndex_;
   std::vector<float> selX_, selY_, selValue_, selCorr_;
   std::vector<float> matrix_;
+  std::vector<float> rowSums_, rowProducts_;
   std::vector<std::int32_t> pivot_;
   std::vector<std::int32_t> chosen_;
+  std::vector<float> kept_;
 };
 
 }  // namespace

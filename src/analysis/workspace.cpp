@@ -71,6 +71,8 @@ void workspaceSetUp(OaWorkspace& ws, std::int32_t nData, std::int32_t nj, std::i
   ws.selValue = allocateEntries<float>(limit);
   ws.selCorr = allocateEntries<float>(limit);
   ws.matrix = allocateEntries<float>(limit * limit);
+  ws.rowSums = allocateEntries<float>(limit);
+  ws.rowProducts = allocateEntries<float>(limit);
 
   ws.lineCapacity = static_cast<std::int32_t>(line);
   ws.lineBuffer = allocateEntries<float>(line);
@@ -149,6 +151,8 @@ void workspaceRelease(OaWorkspace& ws) {
   release(ws.selValue);
   release(ws.selCorr);
   release(ws.matrix);
+  release(ws.rowSums);
+  release(ws.rowProducts);
   release(ws.lineBuffer);
   release(ws.pivot);
   release(ws.corrTable);

@@ -46,6 +46,10 @@ struct OaWorkspace {
 
   // limit x limit, row-major with stride limit.
   float* matrix = nullptr;
+  // Per row of the inverted matrix (limit entries each): its entry sum and its
+  // product with the chosen cells' values.
+  float* rowSums = nullptr;
+  float* rowProducts = nullptr;
 
   // Line buffer of the Shapiro filter, max(nj, nk) entries.
   std::int32_t lineCapacity = 0;

@@ -115,8 +115,10 @@ TEST(InverseCache, KeptInverseGivesTheEstimateOfAFreshOne) {
   cached.setCells(cells);
   fresh.setCells(cells);
   std::vector<std::int32_t> chosen(static_cast<std::size_t>(s.CorrelationSampleSize));
+  std::vector<float> products(chosen.size());
   InverseCache cache;
   cache.chosen = chosen.data();
+  cache.products = products.data();
   int reused = 0, estimates = 0;
   for (std::int32_t j = 0; j < RandomLayer::nj; ++j) {
     for (std::int32_t k = 0; k < RandomLayer::nk; ++k) {
