@@ -45,6 +45,12 @@ std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSe
 // in place with INVMTX. Returns 0, or -1 when the inversion fails.
 std::int32_t buildCorrelationMatrix(OaWorkspace& ws, std::int32_t m, const RunSettings& settings);
 
+// The filling step of buildCorrelationMatrix alone (m <= ws.limit). With
+// vectorised, the processor's vector body where it has one; both give the
+// same bits.
+void fillCorrelationMatrix(OaWorkspace& ws, std::int32_t m, const RunSettings& settings,
+                           bool vectorised = true);
+
 // With a the inverted matrix (row stride ws.limit): mean = (sum of a's
 // row products with values) / (sum of all of a's n x n entries); subtracts the
 // mean from values[0..n-1] in place and hands back the mean and the entry sum.

@@ -5,6 +5,8 @@
 
 #include <array>
 #include <cmath>
+#include <cstring>
+#include <random>
 #include <vector>
 
 #include "analysis/correlation.h"
@@ -98,6 +100,35 @@ TEST(ObjanClosedForm, CorrelationMatrixIsInvertedWithTheErrorTermOnItsDiagonal) 
         }
         EXPECT_NEAR(product, i == j ? 1.0 : 0.0, 1e-5) << errorVariance << ": " << i << j;
       }
+    }
+  }
+}
+
+TEST(ObjanClosedForm, VectorFillGivesTheBitsOfTheEntryByEntryFill) {
+  // Blocks of 1 to 40 cells (rows of several vectors with a partial last one),
+  // strides with and without room beyond the block, positions whose squared
+  // distances fall inside and beyond a deliberately small table (nodes 1 x 6:
+  // the table ends at 26) and off the whole nodes, and a zero crossing of 0,
+  // which makes the diagonal not a number.
+  std::mt19937 random(31);
+  std::uniform_int_distribution<int> node(0, 9);
+  for (int trial = 0; trial < 120; ++trial) {
+    const std::int32_t m = 1 + trial % 40;
+    RunSettings s = settings250(m + (trial / 40) * 5, 10.0f);
+    if (trial % 7 == 3) s.ZeroCrossingDistance = 0.0f;
+    ScopedWorkspace vector(0, 1, 6, s), plain(0, 1, 6, s);
+    for (std::int32_t i = 0; i < m; ++i) {
+      const float off = trial % 5 == 0 && i % 3 == 0 ? 0.5f : 0.0f;
+      vector.ws.selX[i] = plain.ws.selX[i] = static_cast<float>(node(random)) + off;
+      vector.ws.selY[i] = plain.ws.selY[i] = static_cast<float>(node(random));
+    }
+    fillCorrelationMatrix(vector.ws, m, s, true);
+    fillCorrelationMatrix(plain.ws, m, s, false);
+    for (std::int32_t i = 0; i < m; ++i) {
+      ASSERT_EQ(std::memcmp(vector.ws.matrix + i * s.CorrelationSampleSize,
+                            plain.ws.matrix + i * s.CorrelationSampleSize, m * sizeof(float)),
+                0)
+          << "trial " << trial << " row " << i;
     }
   }
 }
