@@ -1,4 +1,3 @@
-#include <cstdlib>
 // Matrix inversion of the optimal interpolation: Gauss-Jordan elimination with
 // full pivoting, in place and in single precision.
 //
@@ -523,7 +522,7 @@ Chosen chooseVariants() {
     chosen.shortRows = f;
     chosen.longRows = f;
   }
-  if (InvertFunction f = variantFunction(InvmtxVariant::kAvx2Padded)) if (!getenv("NOPAD")) chosen.shortRows = f;
+  if (InvertFunction f = variantFunction(InvmtxVariant::kAvx2Padded)) chosen.shortRows = f;
   if (InvertFunction f = variantFunction(InvmtxVariant::kAvx512)) chosen.longRows = f;
   return chosen;
 }
