@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <atomic>
 #include <bit>
+#include <cstdint>
 #include <cstdlib>
 #include <cstring>
 #include <memory>
@@ -55,24 +56,100 @@ struct Handle {
 
 }  // namespace
 
+namespace {
+
+// Bytes of the samples a byte plane is judged by: 16 pieces of 4 KiB spread
+// evenly over it, so that runs and repeats (land, fields that repeat row by
+// row) anywhere in the plane show.
+constexpr std::size_t kSamplePieces = 16;
+constexpr std::size_t kSamplePiece = 4096;
+
+// Whether deflate gains nothing worth having on a byte plane: its samples,
+// deflated together, shrink by less than one per cent. The low bytes of
+// measured or interpolated floats are such noise; deflating them costs more
+// than half of the time of a chunk for a gain of well under one per cent.
+bool incompressible(libdeflate_compressor* compressor, const unsigned char* plane,
+                    std::size_t size, std::vector<unsigned char>& sample,
+                    std::vector<unsigned char>& scratch) {
+  if (size < kSamplePieces * kSamplePiece * 4) return false;  // small planes: just deflate
+  sample.resize(kSamplePieces * kSamplePiece);
+  const std::size_t step = (size - kSamplePiece) / (kSamplePieces - 1);
+  for (std::size_t p = 0; p < kSamplePieces; ++p) {
+    std::memcpy(sample.data() + p * kSamplePiece, plane + p * step, kSamplePiece);
+  }
+  scratch.resize(libdeflate_deflate_compress_bound(compressor, sample.size()));
+  const std::size_t packed = libdeflate_deflate_compress(compressor, sample.data(), sample.size(),
+                                                         scratch.data(), scratch.size());
+  return packed == 0 || packed * 100 >= sample.size() * 99;
+}
+
+// Appends data to out as stored (uncompressed) deflate blocks that are not the
+// stream's last; each block holds at most 65535 bytes.
+void appendStoredBlocks(const unsigned char* data, std::size_t size,
+                        std::vector<unsigned char>& out) {
+  constexpr std::size_t kBlock = 65535;
+  for (std::size_t at = 0; at < size; at += kBlock) {
+    const auto length = static_cast<std::uint16_t>(std::min(kBlock, size - at));
+    const auto inverse = static_cast<std::uint16_t>(~length);
+    // Block header bits: not final, type 00 (stored), then padding to the byte.
+    const unsigned char header[5] = {0x00, static_cast<unsigned char>(length & 0xff),
+                                     static_cast<unsigned char>(length >> 8),
+                                     static_cast<unsigned char>(inverse & 0xff),
+                                     static_cast<unsigned char>(inverse >> 8)};
+    out.insert(out.end(), header, header + 5);
+    out.insert(out.end(), data + at, data + at + length);
+  }
+}
+
+}  // namespace
+
 bool compressShuffledChunk(const float* values, std::size_t count,
                            std::vector<unsigned char>& out) {
   try {
     const std::size_t bytes = count * sizeof(float);
-    std::vector<unsigned char> shuffled(bytes);
+    std::unique_ptr<unsigned char[]> shuffled(new unsigned char[bytes]);
     const auto* in = reinterpret_cast<const unsigned char*>(values);
     for (std::size_t b = 0; b < sizeof(float); ++b) {
-      unsigned char* to = shuffled.data() + b * count;
+      unsigned char* to = shuffled.get() + b * count;
       for (std::size_t i = 0; i < count; ++i) to[i] = in[i * sizeof(float) + b];
     }
     const std::unique_ptr<libdeflate_compressor, void (*)(libdeflate_compressor*)> compressor(
         libdeflate_alloc_compressor(kGrdDeflateLevel), libdeflate_free_compressor);
     if (compressor == nullptr) return false;
-    out.resize(libdeflate_zlib_compress_bound(compressor.get(), bytes));
-    const std::size_t size =
-        libdeflate_zlib_compress(compressor.get(), shuffled.data(), bytes, out.data(), out.size());
-    out.resize(size);
-    return size > 0;
+
+    // The low byte planes come first; those that deflate cannot shrink are
+    // stored as they are, as stored blocks of the same deflate stream. The
+    // highest plane (sign and exponent) is always deflated.
+    std::size_t stored = 0;
+    std::vector<unsigned char> sample, scratch;
+    while (stored + 1 < sizeof(float) &&
+           incompressible(compressor.get(), shuffled.get() + stored * count, count, sample,
+                          scratch)) {
+      ++stored;
+    }
+    const std::size_t storedBytes = stored * count;
+    const std::size_t rest = bytes - storedBytes;
+
+    // zlib stream: header (deflate, 32 KiB window, fastest), the stored
+    // blocks, the deflated rest (ending with the final block), and the
+    // Adler-32 of all the bytes, most significant byte first.
+    out.clear();
+    out.reserve(2 + storedBytes + 5 * (storedBytes / 65535 + 1) +
+                libdeflate_deflate_compress_bound(compressor.get(), rest) + 4);
+    out.push_back(0x78);
+    out.push_back(0x01);
+    appendStoredBlocks(shuffled.get(), storedBytes, out);
+    const std::size_t at = out.size();
+    out.resize(at + libdeflate_deflate_compress_bound(compressor.get(), rest));
+    const std::size_t packed = libdeflate_deflate_compress(
+        compressor.get(), shuffled.get() + storedBytes, rest, out.data() + at, out.size() - at);
+    if (packed == 0) return false;
+    out.resize(at + packed);
+    const std::uint32_t adler = libdeflate_adler32(1, shuffled.get(), bytes);
+    for (int shift = 24; shift >= 0; shift -= 8) {
+      out.push_back(static_cast<unsigned char>(adler >> shift));
+    }
+    return true;
   } catch (const std::bad_alloc&) {
     return false;
   }

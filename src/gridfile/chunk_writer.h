@@ -66,8 +66,10 @@ class ChunkWriter {
 
 // Shuffles the bytes of count 4-byte values (all first bytes, then all second
 // bytes, ...) and deflates them into out as a zlib stream at level 1: a chunk
-// as the shuffle and deflate filters store it. Returns false when out could not
-// be made.
+// as the shuffle and deflate filters store it. Leading byte planes that
+// deflate would not shrink (judged from samples) go into the stream as stored
+// blocks, which every inflater reads like any other. Returns false when out
+// could not be made.
 bool compressShuffledChunk(const float* values, std::size_t count, std::vector<unsigned char>& out);
 
 }  // namespace karnet
