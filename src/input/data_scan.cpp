@@ -84,44 +84,51 @@ void bathymetryExtents(const FileDescription& d, const Cartography& map, const R
       .withNotice(fileNotice(std::string(fileName) + ":" + std::to_string(lineNumber), reason));
 }
 
-// Reads every observation line, turned into the grid frame. Returns the count.
+// Blocks in which the observation file is read and parsed.
+constexpr std::size_t kObservationBlock = std::size_t{16} << 20;
+
+// Reads every observation line, turned into the grid frame, the lines of each
+// block parsed on the run's threads. Returns the count.
 std::int64_t readObservations(RunState& state, const char* fileName, const Rotation& r,
-                              Extent ext[3]) {
+                              int threads, Extent ext[3]) {
   ScatterData& sd = state.scatter;
   std::FILE* file = state.observationFile;
   std::rewind(file);
-  std::string line;
-  std::int64_t stored = 0;
-  std::int64_t lineNumber = 0;
-  for (;;) {
-    const LineRead got = readObservationLine(file, line);
-    if (got == LineRead::kEnd) break;
-    ++lineNumber;
-    if (stored % 1000 == 0) progressCheckCancel();
-    double v[4];
-    if (got == LineRead::kNulByte) waterFileError(state, fileName, lineNumber, "holds a NUL byte");
-    if (!parseObservation(line.c_str(), v)) {
-      const std::string problem = observationLineProblem(line.c_str());
+  // The arrays were sized from the line count; a file that grew since then
+  // must not write past them.
+  const ObservationLinesRead read = readObservationLines(
+      file, sd.capacity, threads, kObservationBlock,
+      [&sd, &r](std::int64_t i, const double* v) {
+        const double x = v[0], y = v[1];
+        sd.x[i] = y * r.si + x * r.co;
+        sd.y[i] = y * r.co - x * r.si;
+        sd.z[i] = v[2];
+        sd.value[i] = v[3];
+      },
+      [] { progressCheckCancel(); });
+  const std::int64_t lineNumber = read.lines + 1;
+  switch (read.stop) {
+    case ObservationLinesRead::Stop::kNulByte:
+      waterFileError(state, fileName, lineNumber, "holds a NUL byte");
+    case ObservationLinesRead::Stop::kUnreadable: {
+      const std::string problem = observationLineProblem(read.stopLine.c_str());
       waterFileError(state, fileName, lineNumber, problem.empty() ? "cannot be read" : problem);
     }
-    // The arrays were sized from the line count; a file that grew since then
-    // must not write past them.
-    if (stored >= sd.capacity) {
+    case ObservationLinesRead::Stop::kBeyondLimit:
       waterFileError(state, fileName, lineNumber, "the file grew while it was read");
-    }
-    const double x = v[0], y = v[1];
-    sd.x[stored] = y * r.si + x * r.co;
-    sd.y[stored] = y * r.co - x * r.si;
-    sd.z[stored] = v[2];
-    sd.value[stored] = v[3];
-    ext[0].add(sd.x[stored]);
-    ext[1].add(sd.y[stored]);
-    ext[2].add(sd.z[stored]);
-    ++stored;
+    case ObservationLinesRead::Stop::kEnd:
+      break;
+  }
+  // Extents in file order (the first of equal values stands, as one pass
+  // over the lines would have it).
+  for (std::int64_t i = 0; i < read.lines; ++i) {
+    ext[0].add(sd.x[i]);
+    ext[1].add(sd.y[i]);
+    ext[2].add(sd.z[i]);
   }
   std::fclose(file);
   state.observationFile = nullptr;
-  return stored;
+  return read.lines;
 }
 
 // Counts where an observation lies: its column (the basic node it bins to,
@@ -233,7 +240,7 @@ void dataScan(RunState& state, const RunContext& context, const char* bathymetry
 
   progressStatus("Reading data file ...");
   Extent obs[3] = {{1e9, -1e9}, {1e9, -1e9}, {1e9, -1e9}};
-  const std::int64_t count = readObservations(state, s.dataFileName, r, obs);
+  const std::int64_t count = readObservations(state, s.dataFileName, r, context.threads, obs);
 
   const double xMin = std::min(obs[0].min, bx.min), xMax = std::max(obs[0].max, bx.max);
   const double yMin = std::min(obs[1].min, by.min), yMax = std::max(obs[1].max, by.max);
