@@ -9,6 +9,7 @@
 
 #include "analysis/correlation.h"
 #include "analysis/invmtx.h"
+#include "analysis/row_sums.h"
 
 namespace karnet {
 
@@ -105,52 +106,13 @@ std::int32_t buildCorrelationMatrix(OaWorkspace& ws, std::int32_t m, const RunSe
   return INVMTX(ws, ws.matrix, m, det) != 0 ? -1 : 0;
 }
 
-namespace {
-
-// Rows i .. i + R - 1 of a (stride `stride`, n columns): their entry sums and
-// their products with values, each a sum over j rising in single precision.
-// The rows of a block are summed side by side, each in its own order, so the
-// chains of additions overlap instead of waiting on one another.
-template <int R>
-inline void rowSumsAndProducts(const float* a, std::int64_t stride, const float* values,
-                               std::int32_t n, std::int32_t i, float* sums, float* products) {
-  float sum[R] = {};
-  float product[R] = {};
-  for (std::int32_t j = 0; j < n; ++j) {
-    const float v = values[j];
-    for (int r = 0; r < R; ++r) {
-      const float x = a[(i + r) * stride + j];
-      sum[r] = sum[r] + x;
-      product[r] = product[r] + x * v;
-    }
-  }
-  for (int r = 0; r < R; ++r) {
-    sums[r] = sum[r];
-    products[r] = product[r];
-  }
-}
-
-constexpr int kRowBlock = 4;
-
-// sums[i] and products[i] of rowSumsAndProducts for every row i < n.
-void allRowSumsAndProducts(const float* a, std::int64_t stride, const float* values,
-                           std::int32_t n, float* sums, float* products) {
-  std::int32_t i = 0;
-  for (; i + kRowBlock <= n; i += kRowBlock) {
-    rowSumsAndProducts<kRowBlock>(a, stride, values, n, i, sums + i, products + i);
-  }
-  for (; i < n; ++i) rowSumsAndProducts<1>(a, stride, values, n, i, sums + i, products + i);
-}
-
-}  // namespace
-
 void removeWeightedMean(const OaWorkspace& ws, const float* a, float* values, std::int32_t n,
                         float& mean, float& weightSum) {
   // The row sums and row products are added to the totals in row order, as a
   // sum over stored row results would be.
   float* rowSum = ws.rowSums;
   float* rowDot = ws.rowProducts;
-  allRowSumsAndProducts(a, ws.limit, values, n, rowSum, rowDot);
+  floatRowSums(a, ws.limit, values, n, n, rowSum, rowDot);
   float total = 0.0f;
   float weighted = 0.0f;
   for (std::int32_t i = 0; i < n; ++i) {
@@ -196,7 +158,7 @@ std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSe
     if (inverted != 0) return -1;
     float weightSum = 0.0f;
     removeWeightedMean(ws, ws.matrix, ws.selValue, m, mean, weightSum);
-    allRowSumsAndProducts(ws.matrix, ws.limit, ws.selValue, m, ws.rowSums, ws.rowProducts);
+    floatRowSums(ws.matrix, ws.limit, ws.selValue, m, m, ws.rowSums, ws.rowProducts);
     if (cache != nullptr) {
       cache->mean = mean;
       std::copy(ws.rowProducts, ws.rowProducts + m, cache->products);

@@ -11,6 +11,7 @@
 
 #include "analysis/correlation.h"
 #include "analysis/objan.h"
+#include "analysis/row_sums.h"
 #include "analysis/select_data.h"
 #include "analysis_fixtures.h"
 #include "common/closed_forms.h"
@@ -130,6 +131,47 @@ TEST(ObjanClosedForm, VectorFillGivesTheBitsOfTheEntryByEntryFill) {
                 0)
           << "trial " << trial << " row " << i;
     }
+  }
+}
+
+TEST(ObjanClosedForm, VectorRowSumsGiveTheBitsOfRowByRowSums) {
+  // Blocks of 1 to 40 rows and columns (several blocks of eight rows, a
+  // partial last one), strides beyond the columns, entries of all magnitudes
+  // and signs with some not-a-number and infinity among them.
+  std::mt19937 random(8);
+  std::uniform_real_distribution<float> entry(-1.0f, 1.0f);
+  std::uniform_int_distribution<int> scale(-30, 30);
+  for (int trial = 0; trial < 160; ++trial) {
+    const std::int32_t rows = 1 + trial % 40;
+    const std::int32_t columns = trial % 3 == 0 ? rows : 1 + (trial * 7) % 40;
+    const std::int64_t stride = columns + trial % 4;
+    std::vector<float> a(static_cast<std::size_t>(rows * stride));
+    std::vector<float> values(static_cast<std::size_t>(columns));
+    for (float& x : a) x = std::ldexp(entry(random), scale(random));
+    for (float& x : values) x = std::ldexp(entry(random), scale(random));
+    if (trial % 11 == 5) a[a.size() / 2] = std::nanf("");
+    if (trial % 13 == 7) values[0] = INFINITY;
+    std::vector<float> sums[2], products[2];
+    std::vector<double> dsums[2], dproducts[2];
+    for (int v = 0; v < 2; ++v) {
+      sums[v].assign(static_cast<std::size_t>(rows), -1.0f);
+      products[v] = sums[v];
+      dsums[v].assign(static_cast<std::size_t>(rows), -1.0);
+      dproducts[v] = dsums[v];
+      floatRowSums(a.data(), stride, values.data(), rows, columns, sums[v].data(),
+                   products[v].data(), v == 0);
+      doubleRowSums(a.data(), stride, values.data(), rows, columns, dproducts[v].data(),
+                    dsums[v].data(), v == 0);
+    }
+    const auto bytes = static_cast<std::size_t>(rows);
+    EXPECT_EQ(std::memcmp(sums[0].data(), sums[1].data(), bytes * 4), 0) << trial;
+    EXPECT_EQ(std::memcmp(products[0].data(), products[1].data(), bytes * 4), 0) << trial;
+    EXPECT_EQ(std::memcmp(dsums[0].data(), dsums[1].data(), bytes * 8), 0) << trial;
+    EXPECT_EQ(std::memcmp(dproducts[0].data(), dproducts[1].data(), bytes * 8), 0) << trial;
+    // And the plain body is the literal row sum.
+    float first = 0.0f;
+    for (std::int32_t j = 0; j < columns; ++j) first = first + a[static_cast<std::size_t>(j)];
+    EXPECT_EQ(std::memcmp(&first, sums[1].data(), 4), 0) << trial;
   }
 }
 
