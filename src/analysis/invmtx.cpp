@@ -240,12 +240,8 @@ std::int32_t invertBaseline(OaWorkspace& ws, float* a, std::int32_t n, float& de
 // not written back, so the block's bits are those of the row loops above.
 constexpr std::int32_t kPaddedMax = 64;
 
-// The padded rows of the block followed, right after its last row, by the
-// pivot keys of each row in the same shape: kept together, so that a key and
-// the rows stored before it are never a multiple of 4 KiB apart (which would
-// make the processor hold the load back until those stores are done).
 struct alignas(32) PaddedBlock {
-  float values[2 * kPaddedMax * kPaddedMax];
+  float values[kPaddedMax * kPaddedMax];
 };
 
 // The pivot keys (pivotKey) of the W vectors of a padded row; notFree holds -1
@@ -264,14 +260,44 @@ template <int W>
   }
 }
 
-// Stores the keys of a padded row and raises the lane-wise greatest keys to them.
+// Raises the lane-wise greatest keys to those of padded row r, and makes r
+// the holder of each lane where its key reaches the greatest (rows come in
+// rising order, so each lane's holder is the last row with its greatest key).
+// notRow is -1 in every lane for a row that is no longer free, else 0.
 template <int W>
 [[gnu::target("avx2"), gnu::always_inline]] inline void takeKeys(const float* row,
                                                                  const __m256i* notFree,
-                                                                 __m256i* keys,
-                                                                 __m256i* greatest) {
+                                                                 __m256i notRow, std::int32_t r,
+                                                                 __m256i* greatest,
+                                                                 __m256i* holder) {
+  __m256i keys[W];
   rowKeys<W>(row, notFree, keys);
-  for (int w = 0; w < W; ++w) greatest[w] = _mm256_max_epi32(greatest[w], keys[w]);
+  const __m256i index = _mm256_set1_epi32(r);
+  for (int w = 0; w < W; ++w) {
+    const __m256i key = _mm256_or_si256(keys[w], notRow);
+    const __m256i below = _mm256_cmpgt_epi32(greatest[w], key);
+    holder[w] = _mm256_blendv_epi8(index, holder[w], below);
+    greatest[w] = _mm256_max_epi32(greatest[w], key);
+  }
+}
+
+// Eliminates column pc from padded row r (its entry there set to 0 first)
+// with the scaled pivot row, and takes the row's keys for the next step.
+template <int W>
+[[gnu::target("avx2"), gnu::always_inline]] inline void eliminateRow(
+    float* row, std::int32_t r, std::int32_t pc, const __m256* atPivot,
+    const __m256* pivotValues, const __m256i* notFree, __m256i notRow, __m256i* greatest,
+    __m256i* holder) {
+  const __m256 zero = _mm256_setzero_ps();
+  const __m256 f = _mm256_set1_ps(row[pc]);
+  for (int w = 0; w < W; ++w) {
+    const __m256 v = _mm256_blendv_ps(_mm256_load_ps(row + 8 * w), zero, atPivot[w]);
+    _mm256_store_ps(row + 8 * w, _mm256_sub_ps(v, _mm256_mul_ps(f, pivotValues[w])));
+  }
+  // Short rows take the keys of a used row too (masked out), which costs less
+  // than a branch the processor cannot foresee; long rows skip them.
+  if (W > 2 && _mm256_testz_si256(notRow, notRow) == 0) return;
+  takeKeys<W>(row, notFree, notRow, r, greatest, holder);
 }
 
 // The greatest of the keys of a padded row.
@@ -325,19 +351,16 @@ template <int W>
   det = 1.0f;
   std::int32_t scale = 0;
 
-  // The pivot keys of every row, kept in the shape of the block; a row that
-  // is no longer free has keys of -1 only, as do used columns and the lanes
-  // beyond the block.
-  float* keyRows = b + n * kStride;
-  auto keysOf = [keyRows](std::int32_t r) {
-    return reinterpret_cast<__m256i*>(keyRows + r * kStride);
-  };
-  const auto* keyAt = reinterpret_cast<const std::int32_t*>(keyRows);
-  // greatest[w]: lane by lane, the greatest key of the free rows.
+  // greatest[w]: lane by lane, the greatest pivot key of the free rows (keys
+  // of used columns and of lanes beyond the block are -1); holder[w]: the last
+  // row holding it.
   __m256i greatest[W];
-  for (int w = 0; w < W; ++w) greatest[w] = _mm256_set1_epi32(-1);
-  for (std::int32_t r = 0; r < n; ++r) takeKeys<W>(rowOf(r), notFree, keysOf(r), greatest);
-  std::int32_t firstFree = 0;  // the lowest free index
+  __m256i holder[W];
+  const __m256i none = _mm256_set1_epi32(-1);
+  for (int w = 0; w < W; ++w) greatest[w] = holder[w] = none;
+  for (std::int32_t r = 0; r < n; ++r) {
+    takeKeys<W>(rowOf(r), notFree, _mm256_setzero_si256(), r, greatest, holder);
+  }
 
   for (std::int32_t s = 0; s < n; ++s) {
     // Pivot search: the greatest key of all free rows; of the entries holding
@@ -345,8 +368,8 @@ template <int W>
     // column-major scan with ">=" takes them. With no key left (every free
     // entry not a number), the first free column and row.
     const std::int32_t best = greatestKey<W>(greatest);
-    std::int32_t pr = firstFree;
-    std::int32_t pc = firstFree;
+    std::int32_t pr = 0;
+    std::int32_t pc = 0;
     if (best >= 0) {
       const __m256i wanted = _mm256_set1_epi32(best);
       std::uint64_t columns = 0;
@@ -357,13 +380,16 @@ template <int W>
                    << (8 * w);
       }
       pc = 63 - __builtin_clzll(columns);
-      for (std::int32_t r = 0; r < n; ++r) pr = keyAt[r * kStride + pc] == best ? r : pr;
+      alignas(32) std::int32_t holders[8];
+      _mm256_store_si256(reinterpret_cast<__m256i*>(holders), holder[pc / 8]);
+      pr = holders[pc % 8];
+    } else {
+      while (used[pc] >= 0) ++pc;  // the first free index
+      pr = pc;
     }
-    for (int w = 0; w < W; ++w) greatest[w] = _mm256_set1_epi32(-1);
+    for (int w = 0; w < W; ++w) greatest[w] = holder[w] = none;
     used[pc] = pr;
     order[s] = pc;
-    for (int w = 0; w < W; ++w) keysOf(pc)[w] = _mm256_set1_epi32(-1);
-    while (firstFree < n && used[firstFree] >= 0) ++firstFree;
     const float p = rowOf(pr)[pc];
 
     det = det * p;
@@ -409,18 +435,15 @@ template <int W>
       _mm256_store_ps(rowB + 8 * w, pivotValues[w]);
     }
 
-    // Elimination of column pc from every other row, its entry there set to 0
-    // first; a row still free takes its pivot keys for the next step.
-    const __m256 zero = _mm256_setzero_ps();
-    for (std::int32_t r = 0; r < n; ++r) {
-      if (r == pc) continue;
-      float* row = rowOf(r);
-      const __m256 f = _mm256_set1_ps(row[pc]);
-      for (int w = 0; w < W; ++w) {
-        const __m256 v = _mm256_blendv_ps(_mm256_load_ps(row + 8 * w), zero, atPivot[w]);
-        _mm256_store_ps(row + 8 * w, _mm256_sub_ps(v, _mm256_mul_ps(f, pivotValues[w])));
-      }
-      if (used[r] < 0) takeKeys<W>(row, notFree, keysOf(r), greatest);
+    // Elimination of column pc from every other row; the rows still free
+    // take their pivot keys for the next step.
+    for (std::int32_t r = 0; r < pc; ++r) {
+      eliminateRow<W>(rowOf(r), r, pc, atPivot, pivotValues, notFree,
+                      _mm256_set1_epi32(~(used[r] >> 31)), greatest, holder);
+    }
+    for (std::int32_t r = pc + 1; r < n; ++r) {
+      eliminateRow<W>(rowOf(r), r, pc, atPivot, pivotValues, notFree,
+                      _mm256_set1_epi32(~(used[r] >> 31)), greatest, holder);
     }
   }
 
