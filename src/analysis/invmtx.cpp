@@ -240,8 +240,13 @@ std::int32_t invertBaseline(OaWorkspace& ws, float* a, std::int32_t n, float& de
 // not written back, so the block's bits are those of the row loops above.
 constexpr std::int32_t kPaddedMax = 64;
 
+// The padded rows of the block followed, right after its last row, by the
+// kept pivot keys of each row (long rows) in the same shape: together, so
+// that a key and the rows stored before it are never a multiple of 4 KiB
+// apart (which would make the processor hold the load back until those
+// stores are done).
 struct alignas(32) PaddedBlock {
-  float values[kPaddedMax * kPaddedMax];
+  float values[2 * kPaddedMax * kPaddedMax];
 };
 
 // The pivot keys (pivotKey) of the W vectors of a padded row; notFree holds -1
@@ -260,34 +265,39 @@ template <int W>
   }
 }
 
-// Raises the lane-wise greatest keys to those of padded row r, and makes r
-// the holder of each lane where its key reaches the greatest (rows come in
-// rising order, so each lane's holder is the last row with its greatest key).
-// notRow is -1 in every lane for a row that is no longer free, else 0.
+// Raises the lane-wise greatest keys to those of padded row r (notRow is -1
+// in every lane for a row that is no longer free, else 0), and notes where
+// they are: in short rows by making r the holder of each lane where its key
+// reaches the greatest (rows come in rising order, so each lane's holder is
+// the last row with its greatest key); in long rows, where that would cost
+// more than looking the row up afterwards, by keeping the row's keys.
 template <int W>
-[[gnu::target("avx2"), gnu::always_inline]] inline void takeKeys(const float* row,
-                                                                 const __m256i* notFree,
-                                                                 __m256i notRow, std::int32_t r,
-                                                                 __m256i* greatest,
-                                                                 __m256i* holder) {
+[[gnu::target("avx2"), gnu::always_inline]] inline void takeKeys(
+    const float* row, const __m256i* notFree, __m256i notRow, std::int32_t r,
+    __m256i* greatest, __m256i* holder, __m256i* kept) {
   __m256i keys[W];
   rowKeys<W>(row, notFree, keys);
   const __m256i index = _mm256_set1_epi32(r);
   for (int w = 0; w < W; ++w) {
     const __m256i key = _mm256_or_si256(keys[w], notRow);
-    const __m256i below = _mm256_cmpgt_epi32(greatest[w], key);
-    holder[w] = _mm256_blendv_epi8(index, holder[w], below);
+    if constexpr (W <= 2) {
+      const __m256i below = _mm256_cmpgt_epi32(greatest[w], key);
+      holder[w] = _mm256_blendv_epi8(index, holder[w], below);
+    } else {
+      kept[w] = key;
+    }
     greatest[w] = _mm256_max_epi32(greatest[w], key);
   }
 }
 
 // Eliminates column pc from padded row r (its entry there set to 0 first)
 // with the scaled pivot row, and takes the row's keys for the next step.
+// rowUsed is -1 for a row that is no longer free, else 0.
 template <int W>
 [[gnu::target("avx2"), gnu::always_inline]] inline void eliminateRow(
     float* row, std::int32_t r, std::int32_t pc, const __m256* atPivot,
-    const __m256* pivotValues, const __m256i* notFree, __m256i notRow, __m256i* greatest,
-    __m256i* holder) {
+    const __m256* pivotValues, const __m256i* notFree, std::int32_t rowUsed, __m256i* greatest,
+    __m256i* holder, __m256i* kept) {
   const __m256 zero = _mm256_setzero_ps();
   const __m256 f = _mm256_set1_ps(row[pc]);
   for (int w = 0; w < W; ++w) {
@@ -295,9 +305,10 @@ template <int W>
     _mm256_store_ps(row + 8 * w, _mm256_sub_ps(v, _mm256_mul_ps(f, pivotValues[w])));
   }
   // Short rows take the keys of a used row too (masked out), which costs less
-  // than a branch the processor cannot foresee; long rows skip them.
-  if (W > 2 && _mm256_testz_si256(notRow, notRow) == 0) return;
-  takeKeys<W>(row, notFree, notRow, r, greatest, holder);
+  // than a branch the processor cannot foresee; long rows skip them (their
+  // kept keys were cleared when they were used).
+  if (W > 2 && rowUsed != 0) return;
+  takeKeys<W>(row, notFree, _mm256_set1_epi32(rowUsed), r, greatest, holder, kept);
 }
 
 // The greatest of the keys of a padded row.
@@ -353,13 +364,16 @@ template <int W>
 
   // greatest[w]: lane by lane, the greatest pivot key of the free rows (keys
   // of used columns and of lanes beyond the block are -1); holder[w]: the last
-  // row holding it.
+  // row holding it (short rows), or each row's keys kept after the rows
+  // (long rows).
   __m256i greatest[W];
   __m256i holder[W];
   const __m256i none = _mm256_set1_epi32(-1);
   for (int w = 0; w < W; ++w) greatest[w] = holder[w] = none;
+  auto* kept = reinterpret_cast<__m256i*>(b + n * kStride);
+  const auto* keptAt = reinterpret_cast<const std::int32_t*>(b + n * kStride);
   for (std::int32_t r = 0; r < n; ++r) {
-    takeKeys<W>(rowOf(r), notFree, _mm256_setzero_si256(), r, greatest, holder);
+    takeKeys<W>(rowOf(r), notFree, _mm256_setzero_si256(), r, greatest, holder, kept + r * W);
   }
 
   for (std::int32_t s = 0; s < n; ++s) {
@@ -380,14 +394,21 @@ template <int W>
                    << (8 * w);
       }
       pc = 63 - __builtin_clzll(columns);
-      alignas(32) std::int32_t holders[8];
-      _mm256_store_si256(reinterpret_cast<__m256i*>(holders), holder[pc / 8]);
-      pr = holders[pc % 8];
+      if constexpr (W <= 2) {
+        alignas(32) std::int32_t holders[8];
+        _mm256_store_si256(reinterpret_cast<__m256i*>(holders), holder[pc / 8]);
+        pr = holders[pc % 8];
+      } else {
+        for (std::int32_t r = 0; r < n; ++r) pr = keptAt[r * kStride + pc] == best ? r : pr;
+      }
     } else {
       while (used[pc] >= 0) ++pc;  // the first free index
       pr = pc;
     }
     for (int w = 0; w < W; ++w) greatest[w] = holder[w] = none;
+    if constexpr (W > 2) {
+      for (int w = 0; w < W; ++w) kept[pc * W + w] = none;
+    }
     used[pc] = pr;
     order[s] = pc;
     const float p = rowOf(pr)[pc];
@@ -438,12 +459,12 @@ template <int W>
     // Elimination of column pc from every other row; the rows still free
     // take their pivot keys for the next step.
     for (std::int32_t r = 0; r < pc; ++r) {
-      eliminateRow<W>(rowOf(r), r, pc, atPivot, pivotValues, notFree,
-                      _mm256_set1_epi32(~(used[r] >> 31)), greatest, holder);
+      eliminateRow<W>(rowOf(r), r, pc, atPivot, pivotValues, notFree, ~(used[r] >> 31),
+                      greatest, holder, kept + r * W);
     }
     for (std::int32_t r = pc + 1; r < n; ++r) {
-      eliminateRow<W>(rowOf(r), r, pc, atPivot, pivotValues, notFree,
-                      _mm256_set1_epi32(~(used[r] >> 31)), greatest, holder);
+      eliminateRow<W>(rowOf(r), r, pc, atPivot, pivotValues, notFree, ~(used[r] >> 31),
+                      greatest, holder, kept + r * W);
     }
   }
 
