@@ -70,7 +70,8 @@ TEST(ChunkCompression, InflatesToTheShuffledBytesAndIsNeverMuchLarger) {
       ASSERT_EQ(r, LIBDEFLATE_SUCCESS) << name << " " << side;
       ASSERT_EQ(got, expected.size()) << name;
       EXPECT_TRUE(back == expected) << name << " " << side;
-      EXPECT_LE(stream.size(), plainSize(expected) + plainSize(expected) / 100 + 64)
+      // Planes are stored when deflate would shrink them by less than 5 %.
+      EXPECT_LE(stream.size(), plainSize(expected) + plainSize(expected) / 20 + 64)
           << name << " " << side;
     }
   }
