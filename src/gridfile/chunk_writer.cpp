@@ -108,15 +108,15 @@ void appendStoredBlocks(const unsigned char* data, std::size_t size,
 
 }  // namespace
 
-bool compressShuffledChunk(const float* values, std::size_t count,
+bool compressShuffledChunk(const void* values, std::size_t count, std::size_t elementSize,
                            std::vector<unsigned char>& out) {
   try {
-    const std::size_t bytes = count * sizeof(float);
+    const std::size_t bytes = count * elementSize;
     std::unique_ptr<unsigned char[]> shuffled(new unsigned char[bytes]);
-    const auto* in = reinterpret_cast<const unsigned char*>(values);
-    for (std::size_t b = 0; b < sizeof(float); ++b) {
+    const auto* in = static_cast<const unsigned char*>(values);
+    for (std::size_t b = 0; b < elementSize; ++b) {
       unsigned char* to = shuffled.get() + b * count;
-      for (std::size_t i = 0; i < count; ++i) to[i] = in[i * sizeof(float) + b];
+      for (std::size_t i = 0; i < count; ++i) to[i] = in[i * elementSize + b];
     }
     const std::unique_ptr<libdeflate_compressor, void (*)(libdeflate_compressor*)> compressor(
         libdeflate_alloc_compressor(kGrdDeflateLevel), libdeflate_free_compressor);
@@ -127,7 +127,7 @@ bool compressShuffledChunk(const float* values, std::size_t count,
     // highest plane (sign and exponent) is always deflated.
     std::size_t stored = 0;
     std::vector<unsigned char> sample, scratch;
-    while (stored + 1 < sizeof(float) &&
+    while (stored + 1 < elementSize &&
            incompressible(compressor.get(), shuffled.get() + stored * count, count, sample,
                           scratch)) {
       ++stored;
@@ -205,26 +205,81 @@ herr_t imageFree(void* block, H5FD_file_image_op_t operation, void* data) {
 void* imageDataCopy(void* data) { return data; }
 herr_t imageDataFree(void*) { return 0; }
 
-struct ItemDataset {
-  Handle dataset;
-  int rank = 0;
-  bool hasTime = false;
-  bool hasZ = false;
-  hsize_t dims[kMaxRank] = {};
-  hsize_t chunk[kMaxRank] = {};
-};
+// Stores the chunks of `slabs` consecutive 2-D slabs of a dataset (each ny
+// rows of nx elements of elementSize bytes, x fastest, one after the other in
+// data) in chunks of cy x cx: each chunk shuffled and deflated on its own, on
+// up to `threads` threads, so the bytes do not depend on their number, then
+// stored in order. Slab s's chunks go to the offset whose leading entries
+// leading(s, offset) sets (it returns how many) and whose last two are the row
+// (from firstRow) and the column. Edge chunks are stored whole, the part
+// outside the data holding `fill` (one element).
+template <typename Leading>
+bool storeChunks(hid_t dataset, std::size_t elementSize, std::int64_t slabs, std::int64_t nx,
+                 std::int64_t ny, std::int64_t cx, std::int64_t cy, std::int64_t firstRow,
+                 const unsigned char* data, const unsigned char* fill, int threads,
+                 Leading leading) {
+  if (cx < 1 || cy < 1) return false;
+  const std::int64_t across = (nx + cx - 1) / cx;
+  const std::int64_t down = (ny + cy - 1) / cy;
+  const std::int64_t perSlab = across * down;
+  const std::int64_t tasks = perSlab * slabs;
+  const auto size = static_cast<std::int64_t>(elementSize);
+  std::vector<std::vector<unsigned char>> compressed(static_cast<std::size_t>(tasks));
+  std::atomic<bool> failed{false};
+#pragma omp parallel for schedule(dynamic, 1) num_threads(threads) if (threads > 1 && tasks > 1)
+  for (std::int64_t t = 0; t < tasks; ++t) {
+    if (failed.load(std::memory_order_relaxed)) continue;
+    try {
+      const std::int64_t slab = t / perSlab;
+      const std::int64_t row0 = (t % perSlab) / across * cy;
+      const std::int64_t col0 = (t % perSlab) % across * cx;
+      const std::int64_t rows = std::min(cy, ny - row0);
+      const std::int64_t cols = std::min(cx, nx - col0);
+      const unsigned char* slabData = data + slab * nx * ny * size;
+      std::vector<unsigned char> chunk;
+      const unsigned char* values = slabData + (row0 * nx + col0) * size;
+      if (rows != cy || cols != cx || cx != nx) {
+        chunk.resize(static_cast<std::size_t>(cx * cy * size));
+        for (std::int64_t e = 0; e < cx * cy; ++e) {
+          std::memcpy(chunk.data() + e * size, fill, elementSize);
+        }
+        for (std::int64_t r = 0; r < rows; ++r) {
+          std::memcpy(chunk.data() + r * cx * size, slabData + ((row0 + r) * nx + col0) * size,
+                      static_cast<std::size_t>(cols * size));
+        }
+        values = chunk.data();
+      }
+      if (!compressShuffledChunk(values, static_cast<std::size_t>(cx * cy), elementSize,
+                                 compressed[static_cast<std::size_t>(t)])) {
+        failed = true;
+      }
+    } catch (const std::bad_alloc&) {
+      failed = true;
+    }
+  }
+  if (failed) return false;
+  for (std::int64_t t = 0; t < tasks; ++t) {
+    hsize_t offset[kMaxRank] = {};
+    const int d = leading(t / perSlab, offset);
+    offset[d] = static_cast<hsize_t>(firstRow + (t % perSlab) / across * cy);
+    offset[d + 1] = static_cast<hsize_t>((t % perSlab) % across * cx);
+    std::vector<unsigned char>& bytes = compressed[static_cast<std::size_t>(t)];
+    if (H5Dwrite_chunk(dataset, H5P_DEFAULT, 0, offset, bytes.size(), bytes.data()) < 0) {
+      return false;
+    }
+    std::vector<unsigned char>().swap(bytes);
+  }
+  return true;
+}
 
-// Whether the dataset's chunks can be written here: 32-bit little-endian
-// floats, chunks one level thick, the filters shuffle then deflate.
-bool directlyWritable(hid_t dataset, const ItemDataset& item) {
+// Whether the dataset is stored in chunks through the filters shuffle then
+// deflate, its values of the given HDF5 type.
+bool shuffledAndDeflated(hid_t dataset, hid_t type) {
   if (std::endian::native != std::endian::little) return false;
-  const Handle type(H5Dget_type(dataset), H5Tclose);
-  if (!type.ok() || H5Tequal(type.id, H5T_IEEE_F32LE) <= 0) return false;
+  const Handle stored(H5Dget_type(dataset), H5Tclose);
+  if (!stored.ok() || H5Tequal(stored.id, type) <= 0) return false;
   const Handle plist(H5Dget_create_plist(dataset), H5Pclose);
   if (!plist.ok() || H5Pget_layout(plist.id) != H5D_CHUNKED) return false;
-  for (int d = 0; d + 2 < item.rank; ++d) {
-    if (item.chunk[d] != 1) return false;
-  }
   if (H5Pget_nfilters(plist.id) != 2) return false;
   const H5Z_filter_t expected[2] = {H5Z_FILTER_SHUFFLE, H5Z_FILTER_DEFLATE};
   for (unsigned f = 0; f < 2; ++f) {
@@ -238,6 +293,24 @@ bool directlyWritable(hid_t dataset, const ItemDataset& item) {
     }
   }
   return true;
+}
+
+struct ItemDataset {
+  Handle dataset;
+  int rank = 0;
+  bool hasTime = false;
+  bool hasZ = false;
+  hsize_t dims[kMaxRank] = {};
+  hsize_t chunk[kMaxRank] = {};
+};
+
+// Whether the dataset's chunks can be written here: 32-bit little-endian
+// floats, chunks one level thick, the filters shuffle then deflate.
+bool directlyWritable(hid_t dataset, const ItemDataset& item) {
+  for (int d = 0; d + 2 < item.rank; ++d) {
+    if (item.chunk[d] != 1) return false;
+  }
+  return shuffledAndDeflated(dataset, H5T_IEEE_F32LE);
 }
 
 bool examine(hid_t dataset, bool withTime, ItemDataset& item) {
@@ -348,64 +421,57 @@ bool ChunkWriter::writeLevels(std::size_t item, std::size_t step, std::int64_t f
 
 bool ChunkWriter::Impl::writeDirect(ItemDataset& item, std::size_t step, std::int64_t first,
                                     std::int64_t count, const float* data) {
-  const std::int64_t nx = static_cast<std::int64_t>(item.dims[item.rank - 1]);
-  const std::int64_t ny = static_cast<std::int64_t>(item.dims[item.rank - 2]);
-  const std::int64_t cx = static_cast<std::int64_t>(item.chunk[item.rank - 1]);
-  const std::int64_t cy = static_cast<std::int64_t>(item.chunk[item.rank - 2]);
-  if (cx < 1 || cy < 1) return false;
-  const std::int64_t across = (nx + cx - 1) / cx;
-  const std::int64_t down = (ny + cy - 1) / cy;
-  const std::int64_t perLevel = across * down;
-  const std::int64_t tasks = perLevel * count;
-  std::vector<std::vector<unsigned char>> compressed(static_cast<std::size_t>(tasks));
-  std::atomic<bool> failed{false};
-  const float fillValue = fill;
-  // Each chunk is compressed on its own, so the bytes do not depend on the
-  // number of threads; they are stored afterwards in order.
-#pragma omp parallel for schedule(dynamic, 1) num_threads(threads) if (threads > 1 && tasks > 1)
-  for (std::int64_t t = 0; t < tasks; ++t) {
-    if (failed.load(std::memory_order_relaxed)) continue;
-    try {
-      const std::int64_t level = t / perLevel;
-      const std::int64_t row0 = (t % perLevel) / across * cy;
-      const std::int64_t col0 = (t % perLevel) % across * cx;
-      const std::int64_t rows = std::min(cy, ny - row0);
-      const std::int64_t cols = std::min(cx, nx - col0);
-      const float* levelData = data + level * nx * ny;
-      std::vector<float> chunk;
-      const float* values = levelData + row0 * nx + col0;
-      if (rows != cy || cols != cx || cx != nx) {
-        // Edge chunks are stored whole; the part outside the grid holds the fill value.
-        chunk.assign(static_cast<std::size_t>(cx * cy), fillValue);
-        for (std::int64_t r = 0; r < rows; ++r) {
-          std::copy(levelData + (row0 + r) * nx + col0, levelData + (row0 + r) * nx + col0 + cols,
-                    chunk.begin() + r * cx);
-        }
-        values = chunk.data();
-      }
-      if (!compressShuffledChunk(values, static_cast<std::size_t>(cx * cy),
-                                 compressed[static_cast<std::size_t>(t)])) {
-        failed = true;
-      }
-    } catch (const std::bad_alloc&) {
-      failed = true;
-    }
+  const auto nx = static_cast<std::int64_t>(item.dims[item.rank - 1]);
+  const auto ny = static_cast<std::int64_t>(item.dims[item.rank - 2]);
+  const auto cx = static_cast<std::int64_t>(item.chunk[item.rank - 1]);
+  const auto cy = static_cast<std::int64_t>(item.chunk[item.rank - 2]);
+  return storeChunks(item.dataset.id, sizeof(float), count, nx, ny, cx, cy, 0,
+                     reinterpret_cast<const unsigned char*>(data),
+                     reinterpret_cast<const unsigned char*>(&fill), threads,
+                     [&item, step, first](std::int64_t level, hsize_t* offset) {
+                       int d = 0;
+                       if (item.hasTime) offset[d++] = step;
+                       if (item.hasZ) offset[d++] = static_cast<hsize_t>(first + level);
+                       return d;
+                     });
+}
+
+std::int64_t ChunkWriter::chunkRows(const std::string& name) {
+  const Handle dataset(H5Dopen2(impl_->file.id, name.c_str(), H5P_DEFAULT), H5Dclose);
+  if (!dataset.ok() || !shuffledAndDeflated(dataset.id, H5T_IEEE_F64LE)) return 0;
+  const Handle plist(H5Dget_create_plist(dataset.id), H5Pclose);
+  hsize_t chunk[2] = {};
+  if (!plist.ok() || H5Pget_chunk(plist.id, 2, chunk) != 2) return 0;
+  return static_cast<std::int64_t>(chunk[0]);
+}
+
+bool ChunkWriter::writeDoubleRows(const std::string& name, std::int64_t firstRow,
+                                  std::int64_t rowCount, const double* data) {
+  const Handle dataset(H5Dopen2(impl_->file.id, name.c_str(), H5P_DEFAULT), H5Dclose);
+  if (!dataset.ok() || data == nullptr || !shuffledAndDeflated(dataset.id, H5T_IEEE_F64LE)) {
+    return false;
   }
-  if (failed) return false;
-  for (std::int64_t t = 0; t < tasks; ++t) {
-    hsize_t offset[kMaxRank] = {};
-    int d = 0;
-    if (item.hasTime) offset[d++] = step;
-    if (item.hasZ) offset[d++] = static_cast<hsize_t>(first + t / perLevel);
-    offset[d++] = static_cast<hsize_t>((t % perLevel) / across * cy);
-    offset[d] = static_cast<hsize_t>((t % perLevel) % across * cx);
-    std::vector<unsigned char>& bytes = compressed[static_cast<std::size_t>(t)];
-    if (H5Dwrite_chunk(item.dataset.id, H5P_DEFAULT, 0, offset, bytes.size(), bytes.data()) < 0) {
-      return false;
-    }
-    std::vector<unsigned char>().swap(bytes);
+  const Handle space(H5Dget_space(dataset.id), H5Sclose);
+  const Handle plist(H5Dget_create_plist(dataset.id), H5Pclose);
+  hsize_t dims[2] = {}, chunk[2] = {};
+  if (!space.ok() || !plist.ok() || H5Sget_simple_extent_ndims(space.id) != 2 ||
+      H5Sget_simple_extent_dims(space.id, dims, nullptr) != 2 ||
+      H5Pget_chunk(plist.id, 2, chunk) != 2) {
+    return false;
   }
-  return true;
+  const auto ny = static_cast<std::int64_t>(dims[0]);
+  const auto cy = static_cast<std::int64_t>(chunk[0]);
+  // Whole chunks of rows, the last band ending with the data.
+  if (firstRow < 0 || rowCount < 1 || cy < 1 || firstRow % cy != 0 ||
+      (rowCount % cy != 0 && firstRow + rowCount != ny) || firstRow + rowCount > ny) {
+    return false;
+  }
+  const double fillValue = 0.0;
+  return storeChunks(dataset.id, sizeof(double), 1, static_cast<std::int64_t>(dims[1]), rowCount,
+                     static_cast<std::int64_t>(chunk[1]), cy, firstRow,
+                     reinterpret_cast<const unsigned char*>(data),
+                     reinterpret_cast<const unsigned char*>(&fillValue), impl_->threads,
+                     [](std::int64_t, hsize_t*) { return 0; });
 }
 
 bool ChunkWriter::writeTime(std::size_t step, double time) {

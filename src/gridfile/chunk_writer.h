@@ -50,6 +50,16 @@ class ChunkWriter {
   // extent is made when it is first written to. false on any failure.
   bool writeLevels(std::size_t item, std::size_t step, std::int64_t firstLevel,
                    std::int64_t levelCount, const float* data);
+  // Rows of the chunks of the 2-D variable `name` of doubles (laid out in
+  // chunks through the filters shuffle then deflate); 0 when there is no such
+  // variable.
+  std::int64_t chunkRows(const std::string& name);
+  // Stores rows firstRow .. firstRow+rowCount-1 of that variable: data holds
+  // rowCount rows of nx doubles. The rows are whole chunks of rows (firstRow a
+  // multiple of chunkRows, and rowCount too unless the rows end the
+  // variable). false on any failure.
+  bool writeDoubleRows(const std::string& name, std::int64_t firstRow, std::int64_t rowCount,
+                       const double* data);
   // Stores the time value of step `step`.
   bool writeTime(std::size_t step, double time);
   // Closes the file and hands over its bytes: *bytes (to be released with
@@ -64,13 +74,15 @@ class ChunkWriter {
   std::unique_ptr<Impl> impl_;
 };
 
-// Shuffles the bytes of count 4-byte values (all first bytes, then all second
-// bytes, ...) and deflates them into out as a zlib stream at level 1: a chunk
+// Shuffles the bytes of count values of elementSize bytes (all first bytes,
+// then all second bytes, ...) and deflates them into out as a zlib stream at
+// level 1: a chunk
 // as the shuffle and deflate filters store it. Leading byte planes that
 // deflate would not shrink (judged from samples) go into the stream as stored
 // blocks, which every inflater reads like any other. Returns false when out
 // could not be made.
-bool compressShuffledChunk(const float* values, std::size_t count, std::vector<unsigned char>& out);
+bool compressShuffledChunk(const void* values, std::size_t count, std::size_t elementSize,
+                           std::vector<unsigned char>& out);
 
 }  // namespace karnet
 

@@ -92,7 +92,9 @@ struct GrdGeoreference {
   bool itemGridMapping = true;
   // Longitude and latitude (degrees) of the nodes of row y (nx of each); when
   // set, the file gets lon(y, x) and lat(y, x) and the item coordinates
-  // "lon lat". false from it fails the file's creation.
+  // "lon lat". false from it fails the file's creation. It is called once for
+  // each row, in any order, from as many threads at once as the header's
+  // compression threads.
   std::function<bool(std::int32_t y, double* lon, double* lat)> rowGeolocation;
   // Global text attributes (title, history, ...), in order; empty texts are left out.
   std::vector<std::pair<std::string, std::string>> globalAttributes;

@@ -4,6 +4,7 @@
 #include <netcdf_mem.h>
 
 #include <algorithm>
+#include <atomic>
 #include <cctype>
 #include <cmath>
 #include <cstdlib>
@@ -241,29 +242,6 @@ void defineGeolocation(NcStatus& status, int ncid, Layout& layout, const GrdItem
   }
 }
 
-// Fills lon and lat row by row, so that only one row of each is held.
-void writeGeolocation(NcStatus& status, int ncid, const Layout& layout, const GrdItem& item,
-                      const GrdGeoreference& g) {
-  const std::size_t nx = static_cast<std::size_t>(item.counts[0]);
-  std::vector<double> lon(nx), lat(nx);
-  for (std::int32_t row = 0; row < item.counts[1] && status.ok(); ++row) {
-    bool made = false;
-    try {
-      made = g.rowGeolocation(row, lon.data(), lat.data());
-    } catch (...) {
-      made = false;
-    }
-    if (!made) {
-      status(NC_EINVAL);
-      return;
-    }
-    const std::size_t start[2] = {static_cast<std::size_t>(row), 0};
-    const std::size_t count[2] = {1, nx};
-    status(nc_put_vara_double(ncid, layout.lonVar, start, count, lon.data()));
-    status(nc_put_vara_double(ncid, layout.latVar, start, count, lat.data()));
-  }
-}
-
 void defineCrs(NcStatus& status, int ncid, const GrdHeader& header) {
   int varid = -1;
   status(nc_def_var(ncid, "crs", NC_INT, 0, nullptr, &varid));
@@ -379,9 +357,8 @@ bool defineFile(int ncid, const GrdHeader& header, Layout& layout) {
     }
     status(nc_put_var_double(ncid, layout.coordVars[d], values.data()));
   }
-  if (g != nullptr && g->rowGeolocation && status.ok()) {
-    writeGeolocation(status, ncid, layout, first, *g);
-  }
+  // lon and lat get their values once the values go into chunks
+  // (writeGeolocation).
   return status.ok();
 }
 
@@ -546,6 +523,11 @@ int grdSetGeoreference(GrdHeader* header, const GrdGeoreference& georeference) {
   return 0;
 }
 
+namespace {
+bool startChunks(GrdFile& file);
+bool writeGeolocation(GrdFile& file, const GrdGeoreference& g, const GrdItem& item);
+}  // namespace
+
 int grdFileCreate(const char* fileName, GrdHeader* header, GrdFile** file) {
   if (file == nullptr) return 1;
   *file = nullptr;
@@ -572,6 +554,14 @@ int grdFileCreate(const char* fileName, GrdHeader* header, GrdFile** file) {
   f->timeVar = layout.timeVar;
   f->hasTime = header->timeAxis;
   f->itemNames = itemNames(*header);
+  // Node positions are part of the layout: a file whose positions cannot be
+  // made is not created.
+  const GrdGeoreference* g = georeferenceOf(*header);
+  if (g != nullptr && g->rowGeolocation &&
+      (!startChunks(*f) || !writeGeolocation(*f, *g, *header->items[0]))) {
+    f->chunks.reset();
+    return 1;
+  }
   header->writeFile = f.get();
   *file = f.release();
   return 0;
@@ -605,6 +595,43 @@ bool startChunks(GrdFile& file) {
   std::free(memory.memory);
   if (file.chunks == nullptr) return false;
   file.chunks->setThreads(file.header->compressionThreads);
+  return true;
+}
+
+// Fills lon and lat band by band (the rows of one chunk), the rows of a band
+// made on the file's compression threads, so that only a band of each is held.
+bool writeGeolocation(GrdFile& file, const GrdGeoreference& g, const GrdItem& item) {
+  const auto nx = static_cast<std::int64_t>(item.counts[0]);
+  const auto ny = static_cast<std::int64_t>(item.counts[1]);
+  const std::int64_t band = file.chunks->chunkRows("lon");
+  if (band < 1 || file.chunks->chunkRows("lat") != band) return false;
+  try {
+    std::vector<double> lon(static_cast<std::size_t>(std::min(band, ny) * nx));
+    std::vector<double> lat(lon.size());
+    const int threads = std::max(file.header->compressionThreads, 1);
+    for (std::int64_t first = 0; first < ny; first += band) {
+      const std::int64_t rows = std::min(band, ny - first);
+      std::atomic<bool> made{true};
+#pragma omp parallel for schedule(dynamic, 8) num_threads(threads) if (threads > 1)
+      for (std::int64_t r = 0; r < rows; ++r) {
+        if (!made.load(std::memory_order_relaxed)) continue;
+        try {
+          if (!g.rowGeolocation(static_cast<std::int32_t>(first + r), lon.data() + r * nx,
+                                lat.data() + r * nx)) {
+            made = false;
+          }
+        } catch (...) {
+          made = false;
+        }
+      }
+      if (!made || !file.chunks->writeDoubleRows("lon", first, rows, lon.data()) ||
+          !file.chunks->writeDoubleRows("lat", first, rows, lat.data())) {
+        return false;
+      }
+    }
+  } catch (const std::bad_alloc&) {
+    return false;
+  }
   return true;
 }
 

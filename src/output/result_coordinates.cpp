@@ -6,6 +6,9 @@
 #include <cmath>
 #include <limits>
 #include <memory>
+#include <mutex>
+#include <string>
+#include <utility>
 #include <vector>
 
 #include "input/cartography.h"
@@ -13,6 +16,55 @@
 
 namespace karnet {
 namespace {
+
+// Cartographies of one projection for threads that transform side by side.
+class CartographyPool {
+ public:
+  CartographyPool(std::string projection, double longitude, double latitude, double orientation,
+                  std::shared_ptr<Cartography> first)
+      : projection_(std::move(projection)),
+        longitude_(longitude),
+        latitude_(latitude),
+        orientation_(orientation) {
+    idle_.push_back(std::move(first));
+  }
+
+  // One cartography, the caller's alone until the lease ends.
+  class Lease {
+   public:
+    explicit Lease(CartographyPool& pool) : pool_(pool), map_(pool.take()) {}
+    ~Lease() { pool_.give(std::move(map_)); }
+    Lease(const Lease&) = delete;
+    Lease& operator=(const Lease&) = delete;
+    const Cartography& map() const { return *map_; }
+
+   private:
+    CartographyPool& pool_;
+    std::shared_ptr<Cartography> map_;
+  };
+
+ private:
+  std::shared_ptr<Cartography> take() {
+    {
+      const std::lock_guard<std::mutex> lock(mutex_);
+      if (!idle_.empty()) {
+        std::shared_ptr<Cartography> map = std::move(idle_.back());
+        idle_.pop_back();
+        return map;
+      }
+    }
+    return std::make_shared<Cartography>(projection_, longitude_, latitude_, orientation_);
+  }
+  void give(std::shared_ptr<Cartography> map) {
+    const std::lock_guard<std::mutex> lock(mutex_);
+    idle_.push_back(std::move(map));
+  }
+
+  const std::string projection_;
+  const double longitude_, latitude_, orientation_;
+  std::mutex mutex_;
+  std::vector<std::shared_ptr<Cartography>> idle_;
+};
 
 bool makeFrame(const FileDescription& d, const Cartography& map, bool local, ResultFrame* f) {
   const double longitude = d.axes[1].origin;
@@ -67,12 +119,17 @@ bool resultGeoreference(const FileDescription& d, const std::string& projection,
   if (local) return true;
 
   const std::size_t nx = static_cast<std::size_t>(d.axes[1].lastIndex) + 1;
-  g->rowGeolocation = [map, frame, dx, dy, nx](std::int32_t row, double* lon, double* lat) {
+  // PROJ objects serve one thread at a time: rows made side by side take
+  // their own from a pool that grows to the number of threads at work.
+  auto pool = std::make_shared<CartographyPool>(projection, d.axes[1].origin, d.axes[2].origin,
+                                                d.misc[0], std::move(map));
+  g->rowGeolocation = [pool, frame, dx, dy, nx](std::int32_t row, double* lon, double* lat) {
     for (std::size_t i = 0; i < nx; ++i) {
       frame.nodePosition(dx, dy, static_cast<double>(i), static_cast<double>(row), &lon[i],
                          &lat[i]);
     }
-    map->projToGeo(nx, lon, lat);
+    CartographyPool::Lease lease(*pool);
+    lease.map().projToGeo(nx, lon, lat);
     return true;
   };
   return true;

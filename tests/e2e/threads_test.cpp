@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 #include <signal.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <cstring>
 #include <sstream>
@@ -21,11 +22,21 @@ const std::map<std::string, std::string> kNightly = {{"buildmode", "nigth"},
                                                      {"SOURCE_DATE_EPOCH", "1700000000"}};
 const std::string kEarlier = "an earlier result";
 
-// A 90 x 70 node basin (LOCAL, 100 m) whose bed deepens eastwards and northwards, with a dry
-// island and a dry corner, and casts at scattered positions (between nodes) reaching at most
+// The grid origin (11.3 E, 55.2 N) in UTM zone 32, metres.
+constexpr double kUtmX = 646381.2, kUtmY = 6119460.7;
+
+// A 90 x 70 node basin (LOCAL, 100 m; or in UTM zone 32 from 11.3 E, 55.2 N, turned by the
+// meridian convergence there) whose bed deepens eastwards and northwards, with a dry island
+// and a dry corner, and casts at scattered positions (between nodes) reaching at most
 // castDepth metres down. A fixed generator makes the same case every time.
-void writeBasin(const TempDir& dir, const ParameterFile& parameters, double castDepth) {
+void writeBasin(const TempDir& dir, const ParameterFile& parameters, double castDepth,
+                bool utm = false) {
   BathymetrySpec b = localBasin(90, 70, 100.0, 0.0f, 0.0, 0.0);
+  if (utm) {
+    b.projection = "UTM-32";
+    b.originLongitude = 11.3;
+    b.originLatitude = 55.2;
+  }
   for (int j = 0; j < b.ny; ++j) {
     for (int i = 0; i < b.nx; ++i) {
       const double di = i - 40.0, dj = j - 30.0;
@@ -47,8 +58,8 @@ void writeBasin(const TempDir& dir, const ParameterFile& parameters, double cast
     const double x = next() * 8900.0, y = next() * 6900.0;
     const double bed = 4.0 + 0.3 * x / 100.0 + 0.2 * y / 100.0;
     for (double z = -0.7; z > -bed && z > -castDepth; z -= 1.3) {
-      obs << x << ' ' << y << ' ' << z << ' ' << 12.0 + 0.2 * z + 0.0004 * x - 0.0003 * y + next()
-          << '\n';
+      obs << x + (utm ? kUtmX : 0.0) << ' ' << y + (utm ? kUtmY : 0.0) << ' ' << z << ' '
+          << 12.0 + 0.2 * z + 0.0004 * x - 0.0003 * y + next() << '\n';
     }
   }
   writeFile(dir.file("observations.txt"), obs.str());
@@ -85,6 +96,7 @@ struct ThreadCase {
   std::string filterType;
   std::string zRange;
   double castDepth;
+  bool utm = false;
 };
 
 TEST(ThreadedRun, SameResultAndLogForOneTwoAndSevenThreads) {
@@ -101,6 +113,8 @@ TEST(ThreadedRun, SameResultAndLogForOneTwoAndSevenThreads) {
       {"bilinear, empty levels", "bilinear", "'12 pts filter'", "0, 11", 8.0},
       {"objective, twelve-point, empty levels", "objective", "'12 pts filter'", "0, 11", 8.0},
       {"objective, Shapiro, empty levels", "objective", "'shapiro'", "0, 11", 8.0},
+      // Projected: every node's longitude and latitude made on the threads as well.
+      {"bilinear, UTM", "bilinear", "'12 pts filter'", "0, 19", 100.0, true},
   };
   for (const ThreadCase& c : cases) {
     SCOPED_TRACE(c.name);
@@ -116,12 +130,24 @@ TEST(ThreadedRun, SameResultAndLogForOneTwoAndSevenThreads) {
     p.decayDistance = "900";
     p.correlationSampleSize = "6";
     p.filterOperations = "2";
-    writeBasin(dir, p, c.castDepth);
+    if (c.utm) p.projection = "'UTM-32'";
+    writeBasin(dir, p, c.castDepth, c.utm);
 
     const RunOutput one = runWith(dir, {"case.pfs"}, {{"KARNET_THREADS", "1"}});
     ASSERT_EQ(one.exitCode, 0) << one.log;
     ASSERT_FALSE(one.result.empty());
     EXPECT_TRUE(contains(one.log, "Statistics for local grid")) << one.log;
+    if (c.utm) {
+      // The casts lie in the grid (the result is not one fill value), and the nodes have
+      // their positions.
+      ASSERT_FALSE(one.values.empty());
+      EXPECT_NE(*std::min_element(one.values.begin(), one.values.end()),
+                *std::max_element(one.values.begin(), one.values.end()));
+      const std::vector<double> lat = readVariable(dir.file("result.nc"), "lat");
+      ASSERT_EQ(lat.size(), 90u * 70u);
+      EXPECT_NEAR(lat.front(), 55.2, 1e-6);
+      EXPECT_GT(lat.back(), 55.25);
+    }
     if (c.analysis == "objective" && c.castDepth < 50.0) {
       // The objective analysis of levels without data fails at every wet node: with casts of
       // at most 8 m and levels every 2 m, the failures outnumber the estimates.

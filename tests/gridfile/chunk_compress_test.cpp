@@ -58,7 +58,7 @@ TEST(ChunkCompression, InflatesToTheShuffledBytesAndIsNeverMuchLarger) {
       for (std::size_t y = 0; y < side; ++y)
         for (std::size_t x = 0; x < side; ++x) values[y * side + x] = value(y, x);
       std::vector<unsigned char> stream;
-      ASSERT_TRUE(compressShuffledChunk(values.data(), values.size(), stream)) << name;
+      ASSERT_TRUE(compressShuffledChunk(values.data(), values.size(), 4, stream)) << name;
 
       const std::vector<unsigned char> expected = shuffle(values);
       std::vector<unsigned char> back(expected.size());
