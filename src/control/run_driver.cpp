@@ -53,8 +53,8 @@ void setupRun(const char* parameterFile, Run& run) {
   // A file that cannot be read leaves the description at its creation values,
   // which the validation below rejects.
   std::string bathymetryProblem;
-  bathymetryRead(run.parameters.inputFiles.FileName, *bathymetry, 1, run.state.bathymetryGrid,
-                 &bathymetryProblem);
+  const bool bathymetryTaken = bathymetryRead(run.parameters.inputFiles.FileName, *bathymetry, 1,
+                                              run.state.bathymetryGrid, &bathymetryProblem) != 0;
   deriveSettings(run.parameters, *bathymetry, run.settings);
   run.state.landValue = run.settings.landValue;
 
@@ -82,6 +82,10 @@ void setupRun(const char* parameterFile, Run& run) {
     throw RunError::fatal("Unable to initialize geo. system");
   }
   run.cartography->geoToProj(longitude, latitude, &run.settings.xOrigo, &run.settings.yOrigo);
+  if (bathymetryTaken) {
+    descriptionFree(run.state.bathymetryDescription);
+    run.state.bathymetryDescription = bathymetry.release();
+  }
 }
 
 int runPhases(Run& run, RunSummary* summary, std::string* writeProblem) {
@@ -147,6 +151,8 @@ void freeRunArrays(RunState& state) {
   scatterDataFree(state.scatter);
   descriptionFree(state.resultDescription);
   state.resultDescription = nullptr;
+  descriptionFree(state.bathymetryDescription);
+  state.bathymetryDescription = nullptr;
 }
 
 void runDriver(Run& run) {

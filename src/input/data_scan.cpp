@@ -8,6 +8,7 @@
 #include <cstdlib>
 #include <limits>
 #include <string>
+#include <utility>
 
 #include "control/log.h"
 #include "control/progress.h"
@@ -224,13 +225,18 @@ void dataScan(RunState& state, const RunContext& context, const char* bathymetry
   r.turn(s.xOrigo, s.yOrigo, &xg0, &yg0);
   const double zg0 = static_cast<double>(static_cast<float>(s.l0 - s.lx - 1) * s.dz);
 
-  progressStatus("Reading bathymetry file ...");
-  FileDescription* bathymetry = descriptionNew(2);
-  if (bathymetry == nullptr) stopScan(state, "\nUnable to allocate memory \n");
-  std::string problem;
-  if (bathymetryRead(bathymetryFile, *bathymetry, 1, state.bathymetryGrid, &problem) == 0) {
-    descriptionFree(bathymetry);
-    stopScan(state, "\nERROR while reading bathymetry file\n", fileNotice(bathymetryFile, problem));
+  // The bathymetry as run setup read it; read here when that read failed.
+  FileDescription* bathymetry = std::exchange(state.bathymetryDescription, nullptr);
+  if (bathymetry == nullptr) {
+    progressStatus("Reading bathymetry file ...");
+    bathymetry = descriptionNew(2);
+    if (bathymetry == nullptr) stopScan(state, "\nUnable to allocate memory \n");
+    std::string problem;
+    if (bathymetryRead(bathymetryFile, *bathymetry, 1, state.bathymetryGrid, &problem) == 0) {
+      descriptionFree(bathymetry);
+      stopScan(state, "\nERROR while reading bathymetry file\n",
+               fileNotice(bathymetryFile, problem));
+    }
   }
   const double bedMin = static_cast<double>(bathymetry->items[1].values[1]);
   constexpr double kInf = std::numeric_limits<double>::infinity();

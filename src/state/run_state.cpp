@@ -45,6 +45,8 @@ void releaseAll(RunState& state) {
   scatterDataFree(state.scatter);
   descriptionFree(state.resultDescription);
   state.resultDescription = nullptr;
+  descriptionFree(state.bathymetryDescription);
+  state.bathymetryDescription = nullptr;
 }
 
 }  // namespace karnet

@@ -35,6 +35,10 @@ struct RunState {
   FloatGrid3D basicValues;
   FloatGrid3D localValues;
   FileDescription* resultDescription = nullptr;
+  // The bathymetry file's description as run setup read it (with its values
+  // in bathymetryGrid), when that read succeeded; data scanning takes it
+  // instead of reading the file again.
+  FileDescription* bathymetryDescription = nullptr;
   std::FILE* observationFile = nullptr;
   double landValue = 0;
 
