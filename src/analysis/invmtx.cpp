@@ -49,6 +49,46 @@ inline std::int32_t pivotKey(float value, std::int32_t notFree) {
   return magnitude | notFree;
 }
 
+// Takes the pivot p of step s (from 0) into the determinant, scaled down by
+// ten while its magnitude is above 1 (scale counts the scalings), and tests
+// the pivot: false, with the reason in ws.errorText, when it is too small
+// (the matrix singular).
+[[gnu::always_inline]] inline bool takePivot(OaWorkspace& ws, float p, std::int32_t s,
+                                             float& det, std::int32_t& scale) {
+  det = det * p;
+  while (std::fabs(det) > 1.0f) {
+    if (std::isinf(det)) {
+      // No scaling by ten makes an infinite determinant finite: count it as
+      // too large at once instead of dividing for ever.
+      if (scale < kTooLarge) scale = kTooLarge;
+      break;
+    }
+    det = static_cast<float>(static_cast<double>(det) / 10.0);
+    ++scale;
+  }
+  const float stepped = p / static_cast<float>(s + 1);
+  if (std::fabs(static_cast<double>(stepped)) < 1e-4) {
+    ws.errorText = "Matrix singular in INVMTX";
+    return false;
+  }
+  return true;
+}
+
+// The determinant's last steps once the interchanges are undone (det already
+// negated for each): 0 with det unscaled, or -1 when it was scaled too often
+// (det then holds the count).
+[[gnu::always_inline]] inline std::int32_t finishDeterminant(OaWorkspace& ws, float& det,
+                                                             std::int32_t scale) {
+  if (scale >= kTooLarge) {
+    ws.errorText = "Determinant too large in INVMTX";
+    det = static_cast<float>(scale);
+    return -1;
+  }
+  det = static_cast<float>(static_cast<double>(det) * powerOfTen(scale));
+  if (static_cast<double>(det) < 1e-4) ws.errorText = "Determinant very small in INVMTX";
+  return 0;
+}
+
 [[gnu::always_inline]] inline std::int32_t invert(OaWorkspace& ws, float* a, std::int32_t n,
                                                   float& det) {
   if (n < 1) {
@@ -124,24 +164,7 @@ inline std::int32_t pivotKey(float value, std::int32_t notFree) {
     }
     freeCount = kept;
     const float p = rowOf(pr)[pc];
-
-    det = det * p;
-    while (std::fabs(det) > 1.0f) {
-      if (std::isinf(det)) {
-        // No scaling by ten makes an infinite determinant finite: count it as
-        // too large at once instead of dividing for ever.
-        if (scale < kTooLarge) scale = kTooLarge;
-        break;
-      }
-      det = static_cast<float>(static_cast<double>(det) / 10.0);
-      ++scale;
-    }
-
-    const float stepped = p / static_cast<float>(s + 1);
-    if (std::fabs(static_cast<double>(stepped)) < 1e-4) {
-      ws.errorText = "Matrix singular in INVMTX";
-      return -1;
-    }
+    if (!takePivot(ws, p, s, det, scale)) return -1;
 
     // The pivot entry becomes 1 before the exchange, and each eliminated row's
     // entry in column pc becomes 0 before its update. Both are folded into the
@@ -200,16 +223,7 @@ inline std::int32_t pivotKey(float value, std::int32_t notFree) {
     }
   }
 
-  if (scale >= kTooLarge) {
-    ws.errorText = "Determinant too large in INVMTX";
-    det = static_cast<float>(scale);
-    return -1;
-  }
-  // pow(10, 0) is exactly 1 by definition; the usual unscaled determinant
-  // spares the call.
-  det = static_cast<float>(static_cast<double>(det) * powerOfTen(scale));
-  if (static_cast<double>(det) < 1e-4) ws.errorText = "Determinant very small in INVMTX";
-  return 0;
+  return finishDeterminant(ws, det, scale);
 }
 
 std::int32_t invertBaseline(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
@@ -412,20 +426,7 @@ template <int W>
     used[pc] = pr;
     order[s] = pc;
     const float p = rowOf(pr)[pc];
-
-    det = det * p;
-    while (std::fabs(det) > 1.0f) {
-      if (std::isinf(det)) {
-        if (scale < kTooLarge) scale = kTooLarge;
-        break;
-      }
-      det = static_cast<float>(static_cast<double>(det) / 10.0);
-      ++scale;
-    }
-
-    const float stepped = p / static_cast<float>(s + 1);
-    if (std::fabs(static_cast<double>(stepped)) < 1e-4) {
-      ws.errorText = "Matrix singular in INVMTX";
+    if (!takePivot(ws, p, s, det, scale)) {
       for (std::int32_t r = 0; r < n; ++r) {
         for (int w = 0; w < W; ++w) {
           _mm256_maskstore_ps(a + r * stride + 8 * w, inside[w], _mm256_load_ps(rowOf(r) + 8 * w));
@@ -494,14 +495,7 @@ template <int W>
     }
   }
 
-  if (scale >= kTooLarge) {
-    ws.errorText = "Determinant too large in INVMTX";
-    det = static_cast<float>(scale);
-    return -1;
-  }
-  det = static_cast<float>(static_cast<double>(det) * powerOfTen(scale));
-  if (static_cast<double>(det) < 1e-4) ws.errorText = "Determinant very small in INVMTX";
-  return 0;
+  return finishDeterminant(ws, det, scale);
 }
 
 // The padded variant for blocks that it takes, the row-loop variant beyond.
