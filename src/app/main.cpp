@@ -3,7 +3,9 @@
 // The entry records the run mode in H84, then either runs the computation under
 // the progress host (argument "//apv") or directly. The run never comes back
 // here: it ends the process through the exit path of the run control.
+#include <fcntl.h>
 #include <strings.h>
+#include <unistd.h>
 
 #include <cstdio>
 #include <cstdlib>
@@ -16,11 +18,14 @@
 #include "control/run_driver.h"
 #include "control/termination.h"
 #include "control/threads.h"
+#include "params/run_setup.h"
 
 namespace {
 
 constexpr char kUsage[] = "Usage: karnet.exe [//apv] [options] pfs-file";
 constexpr char kThreadsError[] = "--threads and KARNET_THREADS take a number from 1 to 4096";
+constexpr char kOwnLogError[] =
+    "ERROR: the parameter file's name ends in .log, the name its log file would take: rename it";
 
 constexpr char kHelp[] =
     "\n"
@@ -82,16 +87,32 @@ karnet::CrossValidationRequest crossValidation;
 
   char logFileName[karnet::kFileNameSize];
   std::FILE* log = nullptr;
+  bool held = false;
   if (!karnet::rankLeads()) {
     // In a run over several processes the first one keeps the log.
     log = std::fopen("/dev/null", "w");
   } else if (karnet::makeLogFileName(parameterFile, logFileName) != 0) {
-    log = std::fopen(logFileName, "w");
+    // The log takes the parameter file's name with .log: a parameter file
+    // already named so would be its own log.
+    if (karnet::sameExistingFile(logFileName, parameterFile)) {
+      karnet::logSetStream(stderr);
+      karnet::endRun(karnet::RunError::fatal(kOwnLogError));
+    }
+    // Opened without emptying it: it is emptied once the run's inputs are
+    // known not to include it (held until then).
+    const int fd = ::open(logFileName, O_WRONLY | O_CREAT | O_CLOEXEC, 0666);
+    log = fd >= 0 ? ::fdopen(fd, "w") : nullptr;
+    if (log == nullptr && fd >= 0) ::close(fd);
+    held = log != nullptr;
   }
   // Line-buffered, so that a user (or a script) following the log sees each
   // report line as soon as it is written; the log is small.
   if (log != nullptr) std::setvbuf(log, nullptr, _IOLBF, 0);
-  karnet::logSetStream(log != nullptr ? log : stderr);
+  if (held) {
+    karnet::logHold(log);
+  } else {
+    karnet::logSetStream(log != nullptr ? log : stderr);
+  }
 
   karnet::RunInvocation invocation;
   invocation.commandLine = karnet::commandLineText(programPath, count, arguments);

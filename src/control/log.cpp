@@ -1,13 +1,76 @@
 // The run's single report stream.
 #include "control/log.h"
 
+#include <unistd.h>
+
 #include <cstdarg>
+#include <cstdlib>
 #include <cstring>
+#include <utility>
 #include <vector>
 
 namespace karnet {
 
 std::FILE* logStream = nullptr;
+
+namespace {
+
+// The held log file and the memory stream that takes its lines meanwhile.
+std::FILE* heldFile = nullptr;
+std::FILE* heldLines = nullptr;
+char* heldText = nullptr;
+std::size_t heldSize = 0;
+
+// Closes the memory stream; its text stays in heldText (heldSize bytes).
+void endHolding() {
+  if (logStream == heldLines) logStream = nullptr;
+  std::fclose(heldLines);
+  heldLines = nullptr;
+}
+
+void freeHeldText() {
+  std::free(heldText);
+  heldText = nullptr;
+  heldSize = 0;
+}
+
+}  // namespace
+
+void logHold(std::FILE* file) {
+  if (file == nullptr) return;
+  heldLines = open_memstream(&heldText, &heldSize);
+  if (heldLines == nullptr) {
+    // Without memory to hold them, the lines go to the file at once.
+    if (ftruncate(fileno(file), 0) != 0) {
+      // A log that cannot be emptied is written over from its start.
+    }
+    logStream = file;
+    return;
+  }
+  heldFile = file;
+  logStream = heldLines;
+}
+
+void logRelease() {
+  if (heldFile == nullptr) return;
+  endHolding();
+  std::FILE* file = std::exchange(heldFile, nullptr);
+  if (ftruncate(fileno(file), 0) != 0) {
+    // A log that cannot be emptied is written over from its start.
+  }
+  if (heldSize > 0) std::fwrite(heldText, 1, heldSize, file);
+  freeHeldText();
+  logStream = file;
+}
+
+void logDiscardHeld() {
+  if (heldFile == nullptr) return;
+  endHolding();
+  std::fclose(std::exchange(heldFile, nullptr));
+  if (heldSize > 0) std::fwrite(heldText, 1, heldSize, stderr);
+  freeHeldText();
+  logStream = stderr;
+}
 
 void logSetStream(std::FILE* stream) { logStream = stream; }
 
@@ -26,6 +89,7 @@ void logPrintf(const char* format, ...) {
 }
 
 void logClose() {
+  logRelease();
   if (logStream == nullptr) return;
   std::FILE* stream = logStream;
   logStream = nullptr;

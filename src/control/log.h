@@ -16,7 +16,19 @@ void logSetStream(std::FILE* stream);
 void logWrite(const char* text);
 // printf-style write to the log stream (nothing when it is null), no newline rule.
 void logPrintf(const char* format, ...) __attribute__((format(printf, 1, 2)));
+// Closes the log (releasing a held one first).
 void logClose();
+
+// A log file opened without emptying it, because it might yet turn out to be
+// one of the run's inputs (a data file named like the log): until logRelease
+// or logDiscardHeld the lines go to memory and the file is not touched.
+void logHold(std::FILE* file);
+// Empties the held log file and writes the lines held so far; the log goes
+// on there.
+void logRelease();
+// Leaves the held log file as it was and closes it; the lines held so far and
+// all later ones go to the standard error stream.
+void logDiscardHeld();
 
 // Where the phases send their report lines. The run's log is one sink; a
 // ReportBuffer collects the lines of work done on other threads, which the

@@ -7,6 +7,7 @@
 #include <string>
 
 #include "analysis/objective_analysis.h"
+#include "control/command_line.h"
 #include "control/log.h"
 #include "control/progress.h"
 #include "control/cross_validate_run.h"
@@ -43,9 +44,29 @@ RunContext contextOf(Run& run) {
 
 void setupRun(const char* parameterFile, Run& run) {
   std::string parameterProblem;
-  if (readParameterFile(parameterFile, run.parameters, &parameterProblem) == 0) {
+  const bool read = readParameterFile(parameterFile, run.parameters, &parameterProblem) != 0;
+  // The log file was opened without emptying it: one of the run's inputs (as
+  // far as the parameter file names them) of the log's name stays as it is,
+  // and the log goes to the standard error stream instead.
+  const bool logIsInput = logIsOwnInput(run.parameters, parameterFile);
+  if (logIsInput) {
+    logDiscardHeld();
+  } else {
+    logRelease();
+  }
+  if (!read) {
     // The log holds the reason on the line before; the user sees it too.
     throw RunError::fatal("Error in parameter file").withNotice(notice(parameterProblem));
+  }
+  if (logIsInput) {
+    char logFileName[kFileNameSize];
+    makeLogFileName(parameterFile, logFileName);
+    char message[1024];
+    std::snprintf(message, sizeof message,
+                  "ERROR: log file %s is one of the run's input files: it is kept, the log is "
+                  "shown here",
+                  logFileName);
+    throw RunError::fatal(message);
   }
 
   std::unique_ptr<FileDescription, DescriptionDeleter> bathymetry(descriptionNew(2));

@@ -27,28 +27,31 @@ void copyText(char* destination, std::size_t size, const char* source) {
 // or never end.
 bool readable(const char* path) { return inputFileProblem(path).empty(); }
 
+}  // namespace
 
-// True when both names lead to one existing file (also through links).
-bool sameFile(const char* a, const char* b) {
+bool sameExistingFile(const char* a, const char* b) {
   struct stat first, second;
   return a[0] != '\0' && b[0] != '\0' && ::stat(a, &first) == 0 && ::stat(b, &second) == 0 &&
          first.st_dev == second.st_dev && first.st_ino == second.st_ino;
 }
 
-}  // namespace
+bool logIsOwnInput(const RunParameters& parameters, const char* parameterFile) {
+  char logFileName[kFileNameSize];
+  if (makeLogFileName(parameterFile, logFileName) == 0) return false;
+  return sameExistingFile(logFileName, parameters.inputFiles.FileName) ||
+         sameExistingFile(logFileName, parameters.inputFiles.DataFileName) ||
+         sameExistingFile(logFileName, parameterFile);
+}
 
 bool resultIsOwnFile(const RunParameters& parameters, const char* parameterFile) {
   const char* result = parameters.outputData.FileName;
   char logFileName[kFileNameSize];
   const bool hasLog = makeLogFileName(parameterFile, logFileName) != 0;
-  return sameFile(result, parameters.inputFiles.FileName) ||
-         sameFile(result, parameters.inputFiles.DataFileName) ||
-         sameFile(result, parameterFile) || (hasLog && sameFile(result, logFileName));
+  return sameExistingFile(result, parameters.inputFiles.FileName) ||
+         sameExistingFile(result, parameters.inputFiles.DataFileName) ||
+         sameExistingFile(result, parameterFile) ||
+         (hasLog && sameExistingFile(result, logFileName));
 }
-
-namespace {
-
-}  // namespace
 
 void deriveSettings(const RunParameters& p, const FileDescription& bathymetry, RunSettings& s) {
   s.j0 = static_cast<std::int32_t>(bathymetry.axes[1].start);

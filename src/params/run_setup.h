@@ -15,6 +15,14 @@ struct RunSettings;
 void deriveSettings(const RunParameters& parameters, const FileDescription& bathymetry,
                     RunSettings& settings);
 
+// True when both names lead to one existing file (also through links).
+bool sameExistingFile(const char* a, const char* b);
+
+// True when the run's log file (the parameter file's name with .log) is one
+// of its inputs as the parameters name them: the bathymetry, the data file or
+// the parameter file itself. Such a file must not be emptied for the log.
+bool logIsOwnInput(const RunParameters& parameters, const char* parameterFile);
+
 // True when the result file's name leads to one of the run's own files (an
 // input, the parameter file or its log): writing the result would destroy it.
 bool resultIsOwnFile(const RunParameters& parameters, const char* parameterFile);

@@ -554,6 +554,41 @@ TEST(BadInput, BathymetryFiles) {
   for (const BadInput& row : bathymetryRows()) runRow(row);
 }
 
+TEST(BadInput, AnInputNamedLikeTheLogIsKept) {
+  // The log takes the parameter file's name with .log. Were an input of that name emptied for
+  // the log, the run would destroy it (and then fail on an empty file): the run stops instead,
+  // says why on the standard error stream and leaves the file, and an earlier result, alone.
+  struct Row {
+    const char* name;
+    std::function<void(ParameterFile&)> edit;
+    const char* input;     // copied to case.log before the run
+    const char* parameters;  // the parameter file's name
+  };
+  const Row rows[] = {
+      {"observations", [](ParameterFile& p) { p.dataFileName = "|case.log|"; }, "observations.txt",
+       "case.pfs"},
+      {"bathymetry", [](ParameterFile& p) { p.fileName = "|case.log|"; }, "bathymetry.nc",
+       "case.pfs"},
+      {"the parameter file itself", {}, "case.pfs", "case.log"},
+  };
+  for (const Row& row : rows) {
+    SCOPED_TRACE(row.name);
+    TempDir dir;
+    ParameterFile p;
+    if (row.edit) row.edit(p);
+    writeSmallCase(dir, p);
+    writeFile(dir.file("result.nc"), kEarlierResult);
+    const std::string input = readFile(dir.file(row.input));
+    writeFile(dir.file("case.log"), input);
+    const ProcessResult r = runProgram(KARNET_BINARY, {row.parameters}, dir.path(), kBatch, {}, 30);
+    EXPECT_EQ(r.termSignal, 0);
+    EXPECT_EQ(r.exitCode, 1) << r.err;
+    EXPECT_TRUE(readFile(dir.file("case.log")) == input) << "the input was changed";
+    EXPECT_TRUE(contains(r.err, "log")) << r.err;
+    EXPECT_EQ(readFile(dir.file("result.nc")), kEarlierResult);
+  }
+}
+
 TEST(BadInput, ResultFiles) {
   for (const BadInput& row : outputRows()) runRow(row);
 }
