@@ -5,6 +5,8 @@
 #include <cmath>
 #include <cstdlib>
 #include <cstring>
+#include <memory>
+#include <utility>
 #include <vector>
 
 namespace karnet {
@@ -93,6 +95,25 @@ std::int64_t splitPieces(char* text, std::size_t size, int count, std::int64_t f
   return index - firstIndex;
 }
 
+// Bytes of the block being read, left uninitialised.
+class Buffer {
+ public:
+  explicit Buffer(std::size_t size) : data_(new char[size]), size_(size) {}
+  char* data() { return data_.get(); }
+  std::size_t size() const { return size_; }
+  // Makes room for size bytes, keeping the first `kept`.
+  void grow(std::size_t size, std::size_t kept) {
+    std::unique_ptr<char[]> larger(new char[size]);
+    std::memcpy(larger.get(), data_.get(), kept);
+    data_ = std::move(larger);
+    size_ = size;
+  }
+
+ private:
+  std::unique_ptr<char[]> data_;
+  std::size_t size_;
+};
+
 }  // namespace
 
 ObservationLinesRead readObservationLines(
@@ -102,13 +123,14 @@ ObservationLinesRead readObservationLines(
   ObservationLinesRead result;
   const std::size_t block = std::max<std::size_t>(blockBytes, 1);
   // One byte beyond the text: the NUL that ends a last line without a line feed.
-  std::vector<char> buffer(block + 1);
+  // Not filled beforehand: a small file touches only the pages it needs.
+  Buffer buffer(block + 1);
   std::size_t held = 0;  // bytes of an unfinished line carried to the next block
   std::int64_t firstIndex = 0;
   std::vector<Piece> pieces;
   const int pieceCount = std::max(threads, 1);
   for (bool atEnd = false; !atEnd;) {
-    if (held == buffer.size() - 1) buffer.resize(2 * held + 1);  // a line longer than the block
+    if (held == buffer.size() - 1) buffer.grow(2 * held + 1, held);  // a line longer than the block
     const std::size_t room = buffer.size() - 1 - held;
     const std::size_t got = std::fread(buffer.data() + held, 1, room, file);
     atEnd = got < room;
