@@ -158,7 +158,7 @@ std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSe
     if (inverted != 0) return -1;
     float weightSum = 0.0f;
     removeWeightedMean(ws, ws.matrix, ws.selValue, m, mean, weightSum);
-    floatRowSums(ws.matrix, ws.limit, ws.selValue, m, m, ws.rowSums, ws.rowProducts);
+    floatRowSums(ws.matrix, ws.limit, ws.selValue, m, m, nullptr, ws.rowProducts);
     if (cache != nullptr) {
       cache->mean = mean;
       std::copy(ws.rowProducts, ws.rowProducts + m, cache->products);

@@ -8,7 +8,7 @@ namespace {
 // Rows i .. i + R - 1: each row's sums over its columns in turn, the rows of
 // the block worked on side by side so that their chains of additions overlap
 // instead of waiting on one another.
-template <int R, typename Sum>
+template <int R, bool WithSums, typename Sum>
 inline void rowBlock(const float* a, std::int64_t stride, const float* values, std::int32_t i,
                      std::int32_t columns, Sum* products, Sum* sums) {
   Sum product[R] = {};
@@ -18,37 +18,41 @@ inline void rowBlock(const float* a, std::int64_t stride, const float* values, s
     for (int r = 0; r < R; ++r) {
       const auto x = static_cast<Sum>(a[(i + r) * stride + j]);
       product[r] = product[r] + x * v;
-      sum[r] = sum[r] + x;
+      if constexpr (WithSums) sum[r] = sum[r] + x;
     }
   }
   for (int r = 0; r < R; ++r) {
     products[i + r] = product[r];
-    sums[i + r] = sum[r];
+    if constexpr (WithSums) sums[i + r] = sum[r];
   }
 }
 
 constexpr int kBlock = 4;
 
-template <typename Sum>
+template <bool WithSums, typename Sum>
 void rowSums(const float* a, std::int64_t stride, const float* values, std::int32_t rows,
              std::int32_t columns, Sum* products, Sum* sums) {
   std::int32_t i = 0;
   for (; i + kBlock <= rows; i += kBlock) {
-    rowBlock<kBlock>(a, stride, values, i, columns, products, sums);
+    rowBlock<kBlock, WithSums>(a, stride, values, i, columns, products, sums);
   }
-  for (; i < rows; ++i) rowBlock<1>(a, stride, values, i, columns, products, sums);
+  for (; i < rows; ++i) rowBlock<1, WithSums>(a, stride, values, i, columns, products, sums);
 }
 
 }  // namespace
 
 void floatRowSums(const float* a, std::int64_t stride, const float* values, std::int32_t rows,
                   std::int32_t columns, float* sums, float* products) {
-  rowSums(a, stride, values, rows, columns, products, sums);
+  if (sums == nullptr) {
+    rowSums<false>(a, stride, values, rows, columns, products, sums);
+  } else {
+    rowSums<true>(a, stride, values, rows, columns, products, sums);
+  }
 }
 
 void doubleRowSums(const float* a, std::int64_t stride, const float* values, std::int32_t rows,
                    std::int32_t columns, double* products, double* sums) {
-  rowSums(a, stride, values, rows, columns, products, sums);
+  rowSums<true>(a, stride, values, rows, columns, products, sums);
 }
 
 }  // namespace karnet

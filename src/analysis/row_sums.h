@@ -9,8 +9,8 @@ namespace karnet {
 // formed over its columns j = 0 .. columns-1 in turn, one addition after the
 // other (several rows are worked on side by side, each in its own order).
 
-// In single precision: sums[i] = sum of a(i, j); products[i] = sum of
-// a(i, j) * values[j].
+// In single precision: sums[i] = sum of a(i, j) (not formed when sums is
+// null); products[i] = sum of a(i, j) * values[j].
 void floatRowSums(const float* a, std::int64_t stride, const float* values, std::int32_t rows,
                   std::int32_t columns, float* sums, float* products);
 

@@ -155,6 +155,9 @@ TEST(ObjanClosedForm, RowSumsAreEachRowsSumInColumnOrder) {
     std::vector<float> sums(static_cast<std::size_t>(rows)), products(sums.size());
     std::vector<double> dsums(sums.size()), dproducts(sums.size());
     floatRowSums(a.data(), stride, values.data(), rows, columns, sums.data(), products.data());
+    std::vector<float> alone(sums.size());  // products without the sums
+    floatRowSums(a.data(), stride, values.data(), rows, columns, nullptr, alone.data());
+    EXPECT_EQ(std::memcmp(alone.data(), products.data(), alone.size() * 4), 0) << trial;
     doubleRowSums(a.data(), stride, values.data(), rows, columns, dproducts.data(), dsums.data());
     for (std::int32_t i = 0; i < rows; ++i) {
       float sum = 0.0f, product = 0.0f;
