@@ -43,6 +43,11 @@ int grdGetItemStatsGlobal(GrdItem* item, double* minimum, double* maximum, doubl
 int grdFindBlockDynamic(GrdHeader* header, GrdFile* file);
 // Reads the next time step of item 1 into data (nx*ny[*nz] floats, x fastest).
 int grdReadItemTimeStep(GrdHeader* header, GrdFile* file, double* time, float* data);
+// grdGetItemStatsGlobal of the first item, then grdFindBlockDynamic and
+// grdReadItemTimeStep; an item of one time step is read only once, its
+// statistics taken from the values read (the same values in the same order).
+int grdReadItemStatsAndFirstStep(GrdHeader* header, GrdFile* file, double* minimum,
+                                 double* maximum, double* time, float* data);
 // Destroys the header (and closes a file opened for reading with it, or drops
 // a file still being written); sets *header to null.
 void grdHeaderDestroy(GrdHeader** header);

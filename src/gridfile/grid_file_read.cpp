@@ -503,15 +503,16 @@ int grdGetCustomBlock(GrdCustomBlock* block, std::int32_t* type, const char** na
   return 0;
 }
 
-int grdGetItemStatsGlobal(GrdItem* item, double* minimum, double* maximum, double* third) {
-  const int ncid = readNcid(item);
-  if (ncid < 0 || !item->usable) return 1;
-  std::int64_t perStep = 0;
-  if (!stepValueCount(*item, &perStep)) return 1;
-  const float deleteValue = item->deleteValue;
+namespace {
+
+// The least and greatest of values that are neither not-a-number nor the
+// delete value, in the order they come.
+struct ValueRange {
+  float deleteValue;
   bool any = false;
   float low = 0.0f, high = 0.0f;
-  auto sink = [&](const float* values, std::size_t count) {
+
+  void add(const float* values, std::size_t count) {
     for (std::size_t i = 0; i < count; ++i) {
       const float v = values[i];
       if (std::isnan(v) || v == deleteValue) continue;
@@ -523,15 +524,53 @@ int grdGetItemStatsGlobal(GrdItem* item, double* minimum, double* maximum, doubl
         high = std::max(high, v);
       }
     }
+  }
+  void give(double* minimum, double* maximum, double* third) const {
+    if (minimum != nullptr) *minimum = any ? low : deleteValue;
+    if (maximum != nullptr) *maximum = any ? high : deleteValue;
+    if (third != nullptr) *third = deleteValue;
+  }
+};
+
+}  // namespace
+
+int grdGetItemStatsGlobal(GrdItem* item, double* minimum, double* maximum, double* third) {
+  const int ncid = readNcid(item);
+  if (ncid < 0 || !item->usable) return 1;
+  std::int64_t perStep = 0;
+  if (!stepValueCount(*item, &perStep)) return 1;
+  ValueRange range{item->deleteValue};
+  auto sink = [&range](const float* values, std::size_t count) {
+    range.add(values, count);
     return true;
   };
   for (std::size_t step = 0; step < item->steps; ++step) {
     if (!streamStep(ncid, *item, step, sink)) return 1;
   }
-  if (!any) low = high = deleteValue;
-  if (minimum != nullptr) *minimum = low;
-  if (maximum != nullptr) *maximum = high;
-  if (third != nullptr) *third = deleteValue;
+  range.give(minimum, maximum, third);
+  return 0;
+}
+
+int grdReadItemStatsAndFirstStep(GrdHeader* header, GrdFile* file, double* minimum,
+                                 double* maximum, double* time, float* data) {
+  if (header == nullptr || header->items.empty()) return 1;
+  GrdItem* item = header->items[0].get();
+  if (item->steps != 1) {
+    return grdGetItemStatsGlobal(item, minimum, maximum, nullptr) != 0 ||
+                   grdFindBlockDynamic(header, file) != 0 ||
+                   grdReadItemTimeStep(header, file, time, data) != 0
+               ? 1
+               : 0;
+  }
+  // One step: the statistics go over the very values read, in the same order.
+  std::int64_t perStep = 0;
+  if (grdFindBlockDynamic(header, file) != 0 || !stepValueCount(*item, &perStep) ||
+      grdReadItemTimeStep(header, file, time, data) != 0) {
+    return 1;
+  }
+  ValueRange range{item->deleteValue};
+  range.add(data, static_cast<std::size_t>(perStep));
+  range.give(minimum, maximum, nullptr);
   return 0;
 }
 

@@ -90,22 +90,19 @@ int bathymetryRead(const char* fileName, FileDescription& description, int wantV
   readMiscBlock(header, description);
 
   double minimum = 0, maximum = 0;
-  if (grdGetItemStatsGlobal(item, &minimum, &maximum, nullptr) != 0) {
-    return fail("its item's values cannot be read");
-  }
-  description.items[1].values[1] = static_cast<float>(minimum);
-  description.items[1].values[2] = static_cast<float>(maximum);
-
   if (wantValues != 0) {
     grid2DFree(grid);
     grid = grid2DFromDescription(description);
     grid2DAlloc(grid);
-    if (grdFindBlockDynamic(header, file) != 0) return fail("its item's values cannot be read");
     double time = 0;
-    if (grdReadItemTimeStep(header, file, &time, grid.data) != 0) {
+    if (grdReadItemStatsAndFirstStep(header, file, &minimum, &maximum, &time, grid.data) != 0) {
       return fail("its item's values cannot be read");
     }
+  } else if (grdGetItemStatsGlobal(item, &minimum, &maximum, nullptr) != 0) {
+    return fail("its item's values cannot be read");
   }
+  description.items[1].values[1] = static_cast<float>(minimum);
+  description.items[1].values[2] = static_cast<float>(maximum);
   grdHeaderDestroy(&header);
   return 1;
 }

@@ -2,6 +2,8 @@
 // geographic information, values and statistics, and malformed files.
 #include <gtest/gtest.h>
 
+#include <cstring>
+
 #include <string>
 #include <vector>
 
@@ -133,7 +135,32 @@ TEST_F(GridFileRead, ValuesAndStatistics) {
     EXPECT_EQ(time, 0.0);
     EXPECT_TRUE(c.read.empty() || data == c.read) << testing::PrintToString(data);
     EXPECT_TRUE(f.readStep(6, &time).empty());
+
+    // Both at once, from one reading: the same statistics and values.
+    Opened g(path);
+    std::vector<float> both(6, -7.0f);
+    double low = 0, high = 0;
+    ASSERT_EQ(grdReadItemStatsAndFirstStep(g.header, g.file, &low, &high, &time, both.data()), 0);
+    EXPECT_EQ((std::vector<double>{low, high}), c.stats);
+    EXPECT_EQ(std::memcmp(both.data(), data.data(), sizeof(float) * 6), 0);
   }
+}
+
+// With several time steps the statistics go over all of them, the values are
+// the first step's.
+TEST_F(GridFileRead, StatisticsOfEveryStepWithTheFirstStepsValues) {
+  makeNc(path, "dimensions: time = UNLIMITED; y = 2; x = 2;\n"
+               "variables: double time(time); time:units = \"seconds since 2000-01-01\";\n"
+               "double y(y); double x(x); float v(time, y, x);\n"
+               "data: time = 0, 60; y = 0, 1; x = 0, 1; v = 1, 2, 3, 4, -5, 6, 7, 80;");
+  Opened f(path);
+  ASSERT_EQ(f.result, 0);
+  std::vector<float> first(4, -7.0f);
+  double low = 0, high = 0, time = -1;
+  ASSERT_EQ(grdReadItemStatsAndFirstStep(f.header, f.file, &low, &high, &time, first.data()), 0);
+  EXPECT_EQ(low, -5.0);
+  EXPECT_EQ(high, 80.0);
+  EXPECT_EQ(first, (std::vector<float>{1, 2, 3, 4}));
 }
 
 // Items larger than one read: values arrive complete and in order whether the
