@@ -612,7 +612,9 @@ bool writeGeolocation(GrdFile& file, const GrdGeoreference& g, const GrdItem& it
     for (std::int64_t first = 0; first < ny; first += band) {
       const std::int64_t rows = std::min(band, ny - first);
       std::atomic<bool> made{true};
-#pragma omp parallel for schedule(dynamic, 8) num_threads(threads) if (threads > 1)
+      // No more threads than there are rows: each thread makes its own PROJ objects.
+      const auto team = static_cast<int>(std::min<std::int64_t>(threads, rows));
+#pragma omp parallel for schedule(dynamic, 8) num_threads(team) if (team > 1)
       for (std::int64_t r = 0; r < rows; ++r) {
         if (!made.load(std::memory_order_relaxed)) continue;
         try {

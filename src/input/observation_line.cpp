@@ -146,7 +146,9 @@ ObservationLinesRead readObservationLines(
     }
     const std::int64_t lines =
         splitPieces(buffer.data(), complete, pieceCount, firstIndex, pieces);
-#pragma omp parallel for schedule(static, 1) num_threads(pieceCount) if (pieces.size() > 1)
+    // A thread per piece (a short text has fewer pieces than threads).
+    const auto team = static_cast<int>(pieces.size());
+#pragma omp parallel for schedule(static, 1) num_threads(team) if (team > 1)
     for (std::size_t p = 0; p < pieces.size(); ++p) parsePiece(pieces[p], limit, store);
     for (const Piece& piece : pieces) {
       if (piece.stop != ObservationLinesRead::Stop::kEnd) {
