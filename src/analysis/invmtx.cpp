@@ -11,8 +11,8 @@
 
 #include <bit>
 #include <cmath>
-#include <climits>
 #include <cstdint>
+#include <iterator>
 #include <utility>
 
 #if defined(__x86_64__) && defined(__GNUC__)
@@ -225,6 +225,8 @@ inline std::int32_t pivotKey(float value, std::int32_t notFree) {
 
   return finishDeterminant(ws, det, scale);
 }
+
+using InvertFunction = std::int32_t (*)(OaWorkspace&, float*, std::int32_t, float&);
 
 std::int32_t invertBaseline(OaWorkspace& ws, float* a, std::int32_t n, float& det) {
   return invert(ws, a, n, det);
@@ -502,28 +504,14 @@ template <int W>
 [[gnu::target("avx2")]] std::int32_t invertAvx2Padded(OaWorkspace& ws, float* a, std::int32_t n,
                                                       float& det) {
   if (n < 1 || ws.limit < n || n > kPaddedMax) return invertAvx2(ws, a, n, det);
-  switch ((n + 7) / 8) {
-    case 1:
-      return invertPadded<1>(ws, a, n, det);
-    case 2:
-      return invertPadded<2>(ws, a, n, det);
-    case 3:
-      return invertPadded<3>(ws, a, n, det);
-    case 4:
-      return invertPadded<4>(ws, a, n, det);
-    case 5:
-      return invertPadded<5>(ws, a, n, det);
-    case 6:
-      return invertPadded<6>(ws, a, n, det);
-    case 7:
-      return invertPadded<7>(ws, a, n, det);
-    default:
-      return invertPadded<8>(ws, a, n, det);
-  }
+  // One body per row width in vectors (kPaddedMax / 8 of them).
+  static constexpr InvertFunction kByWidth[] = {
+      invertPadded<1>, invertPadded<2>, invertPadded<3>, invertPadded<4>,
+      invertPadded<5>, invertPadded<6>, invertPadded<7>, invertPadded<8>};
+  static_assert(std::size(kByWidth) * 8 == kPaddedMax);
+  return kByWidth[(n + 7) / 8 - 1](ws, a, n, det);
 }
 #endif
-
-using InvertFunction = std::int32_t (*)(OaWorkspace&, float*, std::int32_t, float&);
 
 InvertFunction variantFunction(InvmtxVariant variant) {
   if (!invmtxVariantAvailable(variant)) return nullptr;

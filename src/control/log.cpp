@@ -28,6 +28,12 @@ void endHolding() {
   heldLines = nullptr;
 }
 
+// Empties the log file. Should that fail, the log is written over from its
+// start, which is all that can be done.
+void emptyFile(std::FILE* file) {
+  if (ftruncate(fileno(file), 0) != 0) std::rewind(file);
+}
+
 void freeHeldText() {
   std::free(heldText);
   heldText = nullptr;
@@ -41,9 +47,7 @@ void logHold(std::FILE* file) {
   heldLines = open_memstream(&heldText, &heldSize);
   if (heldLines == nullptr) {
     // Without memory to hold them, the lines go to the file at once.
-    if (ftruncate(fileno(file), 0) != 0) {
-      // A log that cannot be emptied is written over from its start.
-    }
+    emptyFile(file);
     logStream = file;
     return;
   }
@@ -55,9 +59,7 @@ void logRelease() {
   if (heldFile == nullptr) return;
   endHolding();
   std::FILE* file = std::exchange(heldFile, nullptr);
-  if (ftruncate(fileno(file), 0) != 0) {
-    // A log that cannot be emptied is written over from its start.
-  }
+  emptyFile(file);
   if (heldSize > 0) std::fwrite(heldText, 1, heldSize, file);
   freeHeldText();
   logStream = file;

@@ -436,39 +436,47 @@ bool ChunkWriter::Impl::writeDirect(ItemDataset& item, std::size_t step, std::in
                      });
 }
 
-std::int64_t ChunkWriter::chunkRows(const std::string& name) {
-  const Handle dataset(H5Dopen2(impl_->file.id, name.c_str(), H5P_DEFAULT), H5Dclose);
-  if (!dataset.ok() || !shuffledAndDeflated(dataset.id, H5T_IEEE_F64LE)) return 0;
-  const Handle plist(H5Dget_create_plist(dataset.id), H5Pclose);
+namespace {
+
+// A 2-D variable of doubles stored in chunks through shuffle and deflate,
+// opened by name: its extent and its chunk shape (rows, columns).
+struct DoubleGrid {
+  Handle dataset;
+  hsize_t dims[2] = {};
   hsize_t chunk[2] = {};
-  if (!plist.ok() || H5Pget_chunk(plist.id, 2, chunk) != 2) return 0;
-  return static_cast<std::int64_t>(chunk[0]);
+
+  bool open(hid_t file, const std::string& name) {
+    dataset = Handle(H5Dopen2(file, name.c_str(), H5P_DEFAULT), H5Dclose);
+    if (!dataset.ok() || !shuffledAndDeflated(dataset.id, H5T_IEEE_F64LE)) return false;
+    const Handle space(H5Dget_space(dataset.id), H5Sclose);
+    const Handle plist(H5Dget_create_plist(dataset.id), H5Pclose);
+    return space.ok() && plist.ok() && H5Sget_simple_extent_ndims(space.id) == 2 &&
+           H5Sget_simple_extent_dims(space.id, dims, nullptr) == 2 &&
+           H5Pget_chunk(plist.id, 2, chunk) == 2;
+  }
+};
+
+}  // namespace
+
+std::int64_t ChunkWriter::chunkRows(const std::string& name) {
+  DoubleGrid grid;
+  return grid.open(impl_->file.id, name) ? static_cast<std::int64_t>(grid.chunk[0]) : 0;
 }
 
 bool ChunkWriter::writeDoubleRows(const std::string& name, std::int64_t firstRow,
                                   std::int64_t rowCount, const double* data) {
-  const Handle dataset(H5Dopen2(impl_->file.id, name.c_str(), H5P_DEFAULT), H5Dclose);
-  if (!dataset.ok() || data == nullptr || !shuffledAndDeflated(dataset.id, H5T_IEEE_F64LE)) {
-    return false;
-  }
-  const Handle space(H5Dget_space(dataset.id), H5Sclose);
-  const Handle plist(H5Dget_create_plist(dataset.id), H5Pclose);
-  hsize_t dims[2] = {}, chunk[2] = {};
-  if (!space.ok() || !plist.ok() || H5Sget_simple_extent_ndims(space.id) != 2 ||
-      H5Sget_simple_extent_dims(space.id, dims, nullptr) != 2 ||
-      H5Pget_chunk(plist.id, 2, chunk) != 2) {
-    return false;
-  }
-  const auto ny = static_cast<std::int64_t>(dims[0]);
-  const auto cy = static_cast<std::int64_t>(chunk[0]);
+  DoubleGrid grid;
+  if (data == nullptr || !grid.open(impl_->file.id, name)) return false;
+  const auto ny = static_cast<std::int64_t>(grid.dims[0]);
+  const auto cy = static_cast<std::int64_t>(grid.chunk[0]);
   // Whole chunks of rows, the last band ending with the data.
   if (firstRow < 0 || rowCount < 1 || cy < 1 || firstRow % cy != 0 ||
       (rowCount % cy != 0 && firstRow + rowCount != ny) || firstRow + rowCount > ny) {
     return false;
   }
   const double fillValue = 0.0;
-  return storeChunks(dataset.id, sizeof(double), 1, static_cast<std::int64_t>(dims[1]), rowCount,
-                     static_cast<std::int64_t>(chunk[1]), cy, firstRow,
+  return storeChunks(grid.dataset.id, sizeof(double), 1, static_cast<std::int64_t>(grid.dims[1]),
+                     rowCount, static_cast<std::int64_t>(grid.chunk[1]), cy, firstRow,
                      reinterpret_cast<const unsigned char*>(data),
                      reinterpret_cast<const unsigned char*>(&fillValue), impl_->threads,
                      [](std::int64_t, hsize_t*) { return 0; });

@@ -39,8 +39,7 @@ bool logIsOwnInput(const RunParameters& parameters, const char* parameterFile) {
   char logFileName[kFileNameSize];
   if (makeLogFileName(parameterFile, logFileName) == 0) return false;
   return sameExistingFile(logFileName, parameters.inputFiles.FileName) ||
-         sameExistingFile(logFileName, parameters.inputFiles.DataFileName) ||
-         sameExistingFile(logFileName, parameterFile);
+         sameExistingFile(logFileName, parameters.inputFiles.DataFileName);
 }
 
 bool resultIsOwnFile(const RunParameters& parameters, const char* parameterFile) {

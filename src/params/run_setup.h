@@ -19,8 +19,9 @@ void deriveSettings(const RunParameters& parameters, const FileDescription& bath
 bool sameExistingFile(const char* a, const char* b);
 
 // True when the run's log file (the parameter file's name with .log) is one
-// of its inputs as the parameters name them: the bathymetry, the data file or
-// the parameter file itself. Such a file must not be emptied for the log.
+// of its inputs as the parameters name them: the bathymetry or the data file.
+// Such a file must not be emptied for the log. (A parameter file that would
+// be its own log is refused before it is read.)
 bool logIsOwnInput(const RunParameters& parameters, const char* parameterFile);
 
 // True when the result file's name leads to one of the run's own files (an
