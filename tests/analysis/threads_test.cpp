@@ -139,21 +139,6 @@ TEST(InverseCache, KeptInverseGivesTheEstimateOfAFreshOne) {
   EXPECT_LT(reused, estimates);
 }
 
-TEST(InverseCache, HoldsOnlyTheSameCellsInTheSameOrder) {
-  std::int32_t room[4];
-  InverseCache cache;
-  cache.chosen = room;
-  const std::int32_t cells[] = {4, 9, 2};
-  EXPECT_FALSE(cache.holds(cells, 3));
-  cache.keep(cells, 3, 0, "");
-  EXPECT_TRUE(cache.holds(cells, 3));
-  const std::int32_t reordered[] = {9, 4, 2};
-  const std::int32_t longer[] = {4, 9, 2, 5};
-  EXPECT_FALSE(cache.holds(reordered, 3));
-  EXPECT_FALSE(cache.holds(longer, 4));
-  EXPECT_FALSE(cache.holds(cells, 2));
-}
-
 TEST(ObjectiveAnalysisThreads, WholePassIsTheSameForAnyThreadCount) {
   // Several levels, some of them without any data, the footprint inside the grid.
   const auto run = [](int threads, std::string& log) {
