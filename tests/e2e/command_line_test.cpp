@@ -30,6 +30,26 @@ TEST(CommandLine, UsageWhenThereIsNoParameterFile) {
   }
 }
 
+// Libraries are never looked for in the folder a run starts in: a file there named like one
+// the program needs must not be loaded.
+TEST(CommandLine, LibrariesAreNotTakenFromTheWorkingDirectory) {
+  const ProcessResult needed = runProgram("/usr/bin/ldd", {KARNET_BINARY}, ".");
+  ASSERT_EQ(needed.exitCode, 0) << needed.err;
+  TempDir dir;
+  int planted = 0;
+  for (const std::string& line : splitLines(needed.out)) {
+    const std::size_t arrow = line.find(" => ");
+    if (arrow == std::string::npos) continue;
+    const std::size_t start = line.find_first_not_of(" \t");
+    writeFile(dir.file(line.substr(start, arrow - start)), "not a library\n");
+    ++planted;
+  }
+  ASSERT_GT(planted, 3) << needed.out;
+  const ProcessResult r = runKarnet({}, dir.path());
+  EXPECT_EQ(r.exitCode, 1) << r.err;
+  EXPECT_TRUE(contains(r.err, kUsage)) << r.err;
+}
+
 // The log lies beside the parameter file, also one that is missing; batch mode silences
 // only the message.
 TEST(CommandLine, MissingParameterFileIsLoggedBesideIt) {
