@@ -13,6 +13,7 @@
 #include "analysis/objective_analysis.h"
 #include "analysis/select_data.h"
 #include "analysis_fixtures.h"
+#include "common/closed_forms.h"
 #include "interp/interp_fixture.h"
 
 namespace karnet {
@@ -23,57 +24,28 @@ using testing::kHoleWide;
 using testing::kLand;
 using Cell = std::array<float, 3>;
 
-// The correlation model in double: (1 - d2/Z^2) exp(-d2 / (2 D^2)), in node
-// units (dx = 1).
+// The correlation model in node units (dx = 1).
 double modelCorrelation(double d2, const RunSettings& s) {
-  const double d = s.DecayDistance;
-  const double z = s.ZeroCrossingDistance;
-  if (d2 > 40.0 * 2.0 * d * d) return 0.0;
-  return std::exp(-d2 / (2.0 * d * d)) * (1.0 - d2 / (z * z));
-}
-
-// Solves a x = b by Gaussian elimination with partial pivoting (n <= 3 here).
-std::vector<double> solve(std::vector<std::vector<double>> a, std::vector<double> b) {
-  const std::size_t n = b.size();
-  for (std::size_t c = 0; c < n; ++c) {
-    std::size_t p = c;
-    for (std::size_t r = c + 1; r < n; ++r) {
-      if (std::fabs(a[r][c]) > std::fabs(a[p][c])) p = r;
-    }
-    std::swap(a[c], a[p]);
-    std::swap(b[c], b[p]);
-    for (std::size_t r = c + 1; r < n; ++r) {
-      const double f = a[r][c] / a[c][c];
-      for (std::size_t q = c; q < n; ++q) a[r][q] -= f * a[c][q];
-      b[r] -= f * b[c];
-    }
-  }
-  std::vector<double> x(n);
-  for (std::size_t i = n; i-- > 0;) {
-    double s = b[i];
-    for (std::size_t q = i + 1; q < n; ++q) s -= a[i][q] * x[q];
-    x[i] = s / a[i][i];
-  }
-  return x;
+  return reference::correlation(d2, s.DecayDistance, s.ZeroCrossingDistance);
 }
 
 // e = 1 - r'A^-1 r + (1 - 1'A^-1 r)^2 / 1'A^-1 1, clipped to [0, 1].
 double expectedError(const std::vector<Cell>& cells, float j, float k, const RunSettings& s) {
   const std::size_t n = cells.size();
-  std::vector<std::vector<double>> a(n, std::vector<double>(n));
-  std::vector<double> r(n);
+  std::vector<double> a(n * n), r(n);
   for (std::size_t p = 0; p < n; ++p) {
     for (std::size_t q = 0; q < n; ++q) {
       const double dx = cells[p][0] - cells[q][0];
       const double dy = cells[p][1] - cells[q][1];
-      a[p][q] = modelCorrelation(dx * dx + dy * dy, s) + (p == q ? s.ErrorVariance / 100.0 : 0.0);
+      a[p * n + q] =
+          modelCorrelation(dx * dx + dy * dy, s) + (p == q ? s.ErrorVariance / 100.0 : 0.0);
     }
     const double dx = j - cells[p][0];
     const double dy = k - cells[p][1];
     r[p] = modelCorrelation(dx * dx + dy * dy, s);
   }
-  const std::vector<double> invR = solve(a, r);
-  const std::vector<double> invOne = solve(a, std::vector<double>(n, 1.0));
+  const std::vector<double> invR = reference::solve(a, r);
+  const std::vector<double> invOne = reference::solve(a, std::vector<double>(n, 1.0));
   double rInvR = 0.0, oneInvR = 0.0, oneInvOne = 0.0;
   for (std::size_t p = 0; p < n; ++p) {
     rInvR += r[p] * invR[p];
@@ -129,17 +101,6 @@ TEST(ErrorVariance, MatchesADoublePrecisionComputationForOneToThreeCells) {
   }
 }
 
-TEST(ErrorVariance, OneCellGivesTheClosedForm) {
-  // With one cell a = 1 + eps on the diagonal and correlation rho:
-  // e = 1 - rho^2/a + (1 - rho/a)^2 a = 2 + eps - 2 rho.
-  const RunSettings s = settingsWithError(10.0f);
-  EXPECT_NEAR(computedError({{5, 5, 3.0f}}, 5, 5, s), 0.1, 1e-6);
-  const double rho = modelCorrelation(1.0, s);
-  EXPECT_NEAR(computedError({{5, 5, 3.0f}}, 5, 6, s), 2.0 + 0.1 - 2.0 * rho, 1e-6);
-  // Without observation error a node on its cell is known exactly.
-  EXPECT_EQ(computedError({{5, 5, 3.0f}}, 5, 5, settingsWithError(0.0f)), 0.0f);
-}
-
 TEST(ErrorVariance, RisesAwayFromTheDataAndIsOneOutOfReach) {
   const RunSettings s = settingsWithError(5.0f);
   const std::vector<Cell> cells = {{4, 4, 1.0f}, {5, 6, 2.0f}, {6, 4, 3.0f}};
@@ -154,6 +115,8 @@ TEST(ErrorVariance, RisesAwayFromTheDataAndIsOneOutOfReach) {
   EXPECT_LT(computedError(cells, 5, 5, s), 0.2f);
   // Beyond the correlation's cut-off the data tell nothing about the node.
   EXPECT_EQ(computedError(cells, 36, 36, s), 1.0f);
+  // Without observation error a node on its only cell is known exactly.
+  EXPECT_EQ(computedError({{5, 5, 3.0f}}, 5, 5, settingsWithError(0.0f)), 0.0f);
 }
 
 // A layer of 12 x 10 nodes whose footprint starts at (1, 1) and spans 10 x 8.

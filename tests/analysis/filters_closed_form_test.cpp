@@ -45,23 +45,6 @@ void expectField(const std::vector<float>& actual, const reference::Field& expec
   }
 }
 
-TEST(FiltersClosedForm, ShapiroOrderEightAndTwelvePointOverOneAndTwoApplications) {
-  for (const int applications : {1, 2}) {
-    SCOPED_TRACE(applications);
-    std::vector<float> shapiro = kField, twelve = kField;
-    std::vector<float> line(kNj);
-    reference::Field shapiroRef = toReference(kField), twelveRef = shapiroRef;
-    for (int a = 0; a < applications; ++a) {
-      shapiroFilter(shapiro.data(), kNj, kNk, 8, kHoleWide, line.data());
-      twelvePointFilter(twelve.data(), kNj, kNk, kHoleWide);
-      reference::shapiro(shapiroRef, 8);
-      reference::twelvePoint(twelveRef, false);
-    }
-    expectField(shapiro, shapiroRef);
-    expectField(twelve, twelveRef);
-  }
-}
-
 TEST(FiltersClosedForm, ShapiroOperatorIsTheMirroredEighthPowerOfTheSecondDifference) {
   // A unit spike in a run of twelve: the 16th difference spreads binomial
   // weights that the mirrored ends fold back. Exact in single precision.
@@ -116,7 +99,7 @@ TEST(FiltersClosedForm, LayerPassSmoothsWithTheChosenFilterThenClips) {
     reference::Field expected = toReference(kField);
     for (int a = 0; a < c.operations; ++a) {
       if (c.filterType == 1) {
-        reference::twelvePoint(expected, false);
+        reference::twelvePoint(expected);
       } else {
         reference::shapiro(expected, 8);
       }
