@@ -307,12 +307,8 @@ TEST_F(MkgridRaster, BadInputIsNamedAndLeavesNoFile) {
   test::putValues(nc, "elevation", std::vector<float>(9, 0.0f));
   // A classic NetCDF file cut short after its header: its values would read as zeros.
   const std::string classic = file("cut.nc");
-  test::writeBytes(classic + ".cdl", "netcdf c {\n" + lonLatCdl(3, 54.0, 3, 8.0) +
-                                         " elevation = 1, 2, 3, 4, 5, 6, 7, 8, 9 ;\n}\n");
-  int made = -1;
-  test::commandOutput("ncgen -k classic -o " + quoted(classic) + " " + quoted(classic + ".cdl"),
-                      &made);
-  ASSERT_EQ(made, 0);
+  test::ncgen(classic, "netcdf c {\n" + lonLatCdl(3, 54.0, 3, 8.0) +
+                           " elevation = 1, 2, 3, 4, 5, 6, 7, 8, 9 ;\n}\n", "classic");
   std::filesystem::resize_file(classic, std::filesystem::file_size(classic) - 20);
   const std::string tif = quoted(file("small.tif")) + " ";
   const std::pair<std::string, const char*> cases[] = {
