@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cmath>
 #include <string>
 #include <tuple>
@@ -109,6 +110,29 @@ TEST_F(BathymetryReadFile, FilesItCannotUse) {
   for (const auto& [name, cdl] : files) {
     Bathymetry b;
     EXPECT_EQ(b.read(file(name)), 0) << name;
+  }
+}
+
+// Inputs found by fuzzing that once misbehaved or cost too much, read the way a run reads them.
+std::string regression(const std::string& name) {
+  return std::string(KARNET_SOURCE_DIR) + "/tests/fuzz/regressions/" + name;
+}
+
+// Classic-format files of a few hundred bytes whose headers declare gigabytes:
+// an attribute of 1.7e9 floats, a variable of some 10^8 dimensions. The NetCDF
+// library allocated and converted the declared sizes first (half a minute and
+// 6.7 GB for the first); the reader now refuses both at once, keeping nothing.
+TEST(BathymetryReadRegression, HugeDeclarationsAreRefused) {
+  for (const char* name : {"bathymetry_huge_attribute.nc", "bathymetry_huge_variable.nc"}) {
+    SCOPED_TRACE(name);
+    FileDescription* description = descriptionNew(2);
+    ASSERT_NE(description, nullptr);
+    FloatGrid2D grid{};
+    const auto start = std::chrono::steady_clock::now();
+    EXPECT_EQ(bathymetryRead(regression(name).c_str(), *description, 1, grid), 0);
+    EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(2));
+    EXPECT_EQ(grid.data, nullptr);
+    descriptionFree(description);
   }
 }
 

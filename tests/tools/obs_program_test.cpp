@@ -172,7 +172,6 @@ TEST(ObsProgram, BadInputStopsWithoutOutputAndHelpNeedsNone) {
       {{"-p", "UTM-32", "allbad.csv"}, "no observation left to write"},
       {{"-p", "UTM-32", "missing.csv"}, "karnet-obs: missing.csv: cannot open"},
       {{"-p", "UTM-32", "."}, "karnet-obs: .: is a directory"},
-      {{"-p", "UTM-32", "--variable", "DOXY", "argo_prof.nc"}, "argo_prof.nc: no variable DOXY"},
       {{"-p", "LOCAL", "argo_prof.nc"}, "pressure needs a latitude"},
       {{"-p", "UTM-99", "good.csv"}, "projection 'UTM-99' not usable"},
       {{"-b", "good.csv", "good.csv"}, "good.csv: cannot read the bathymetry file"},
