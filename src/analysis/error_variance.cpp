@@ -8,31 +8,62 @@
 
 namespace karnet {
 
+namespace {
+
+constexpr std::int32_t kRows = 8;  // rows summed side by side
+
+}  // namespace
+
+double inverseEntrySum(const float* inverse, std::int64_t stride, std::int32_t m) {
+  double total = 0.0;
+  for (std::int32_t i0 = 0; i0 < m; i0 += kRows) {
+    const std::int32_t rows = std::min(kRows, m - i0);
+    double rowSum[kRows];
+    doubleRowSums(inverse + i0 * stride, stride, nullptr, rows, m, nullptr, rowSum);
+    for (std::int32_t k = 0; k < rows; ++k) total += rowSum[k];
+  }
+  return total;
+}
+
 float estimateErrorVariance(const OaWorkspace& ws, std::int32_t m) {
-  double rInvR = 0.0;      // r' A^-1 r
-  double oneInvR = 0.0;    // 1' A^-1 r
-  double oneInvOne = 0.0;  // 1' A^-1 1
-  // Per row i: (A^-1 r)_i and the row's sum, eight rows at a time.
-  constexpr std::int32_t kRows = 8;
+  return estimateErrorVariance(ws, m, ws.matrix, ws.limit,
+                               inverseEntrySum(ws.matrix, ws.limit, m));
+}
+
+float estimateErrorVariance(const OaWorkspace& ws, std::int32_t m, const float* inverse,
+                            std::int64_t stride, double entrySum) {
+  double rInvR = 0.0;   // r' A^-1 r
+  double oneInvR = 0.0;  // 1' A^-1 r
+  // Per row i: (A^-1 r)_i, eight rows at a time.
   for (std::int32_t i0 = 0; i0 < m; i0 += kRows) {
     const std::int32_t rows = std::min(kRows, m - i0);
     double invR[kRows];
-    double rowSum[kRows];
-    doubleRowSums(ws.matrix + i0 * std::int64_t{ws.limit}, ws.limit, ws.selCorr, rows, m, invR,
-                  rowSum);
+    doubleRowSums(inverse + i0 * stride, stride, ws.selCorr, rows, m, invR, nullptr);
     for (std::int32_t k = 0; k < rows; ++k) {
       rInvR += static_cast<double>(ws.selCorr[i0 + k]) * invR[k];
       oneInvR += invR[k];
-      oneInvOne += rowSum[k];
     }
   }
   const double meanTerm = 1.0 - oneInvR;
-  double e = 1.0 - rInvR + meanTerm * meanTerm / oneInvOne;
+  double e = 1.0 - rInvR + meanTerm * meanTerm / entrySum;
   // A not-a-number (from a degenerate matrix) stays one: clipping must not
   // pass it off as a trustworthy value.
   if (e < 0.0) e = 0.0;
   if (e > 1.0) e = 1.0;
   return static_cast<float>(e);
+}
+
+float estimateErrorVariance(const OaWorkspace& ws, const InverseCache& cache, std::int32_t m) {
+  KeptInverse* entry = cache.usedEntry;
+  if (entry == nullptr) {
+    return estimateErrorVariance(ws, m, cache.used, cache.usedStride,
+                                 inverseEntrySum(cache.used, cache.usedStride, m));
+  }
+  if (!entry->hasEntrySum) {
+    entry->entrySum = inverseEntrySum(cache.used, cache.usedStride, m);
+    entry->hasEntrySum = true;
+  }
+  return estimateErrorVariance(ws, m, cache.used, cache.usedStride, entry->entrySum);
 }
 
 }  // namespace karnet

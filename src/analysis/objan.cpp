@@ -124,16 +124,138 @@ void removeWeightedMean(const OaWorkspace& ws, const float* a, float* values, st
   for (std::int32_t i = 0; i < n; ++i) values[i] = values[i] - mean;
 }
 
-bool InverseCache::holds(const std::int32_t* cells, std::int32_t m) const {
-  return count == m && std::equal(cells, cells + m, chosen);
+namespace {
+
+// Room for the inverses of one line: at most this many bytes of cells and
+// values per line kept.
+constexpr std::size_t kCacheBytes = std::size_t{16} << 20;
+
+std::uint64_t cellsHash(const std::int32_t* cells, std::int32_t m) {
+  std::uint64_t h = 0x9e3779b97f4a7c15ull ^ static_cast<std::uint64_t>(m);
+  for (std::int32_t i = 0; i < m; ++i) {
+    h ^= static_cast<std::uint32_t>(cells[i]);
+    h *= 0xff51afd7ed558ccdull;
+    h ^= h >> 29;
+  }
+  return h;
 }
 
-void InverseCache::keep(const std::int32_t* cells, std::int32_t m, std::int32_t inverted,
-                        const char* reason) {
-  std::copy(cells, cells + m, chosen);
-  count = m;
-  result = inverted;
-  errorText = reason;
+bool sameCells(const KeptInverse& e, const std::int32_t* cells, std::int32_t m) {
+  if (e.count != m) return false;
+  // Lists are short: a plain loop beats a call to memcmp.
+  for (std::int32_t i = 0; i < m; ++i) {
+    if (e.cells[i] != cells[i]) return false;
+  }
+  return true;
+}
+
+}  // namespace
+
+InverseCache::InverseCache(std::int32_t limit, std::int64_t lineNodes, bool keepMatrices)
+    : limit_(std::max(limit, 1)), keepMatrices_(keepMatrices) {
+  const std::size_t perEntry =
+      sizeof(std::int32_t) * static_cast<std::size_t>(limit_) +
+      sizeof(float) * static_cast<std::size_t>(limit_) *
+          (keepMatrices ? static_cast<std::size_t>(limit_) + 1 : 1);
+  const auto wanted = static_cast<std::size_t>(std::max<std::int64_t>(lineNodes, 0)) + 1;
+  maxEntries_ = std::clamp<std::size_t>(kCacheBytes / perEntry, 1, wanted);
+  std::size_t slots = 4;
+  while (slots < 2 * maxEntries_) slots *= 2;
+  cellsRoom_ = maxEntries_ * static_cast<std::size_t>(limit_);
+  valuesRoom_ = maxEntries_ * (perEntry - sizeof(std::int32_t) * limit_) / sizeof(float);
+  for (Generation& g : generations_) {
+    g.entries.reserve(maxEntries_);
+    // Only what is kept is ever touched.
+    g.cells = std::make_unique_for_overwrite<std::int32_t[]>(cellsRoom_);
+    g.values = std::make_unique_for_overwrite<float[]>(valuesRoom_);
+    g.slots.assign(slots, 0);
+  }
+}
+
+void InverseCache::startLine() {
+  current_ ^= 1;
+  Generation& g = generations_[current_];
+  if (!g.entries.empty()) {
+    g.entries.clear();
+    g.cellsUsed = 0;
+    g.valuesUsed = 0;
+    std::fill(g.slots.begin(), g.slots.end(), 0u);
+  }
+  last_ = nullptr;
+}
+
+KeptInverse* InverseCache::lookUp(Generation& g, const std::int32_t* cells, std::int32_t m,
+                                  std::uint64_t hash) {
+  const std::size_t mask = g.slots.size() - 1;
+  for (std::size_t at = hash & mask; g.slots[at] != 0; at = (at + 1) & mask) {
+    KeptInverse& e = g.entries[g.slots[at] - 1];
+    if (e.hash == hash && sameCells(e, cells, m)) return &e;
+  }
+  return nullptr;
+}
+
+KeptInverse* InverseCache::add(Generation& g, const std::int32_t* cells, std::int32_t m,
+                               std::uint64_t hash) {
+  const auto count = static_cast<std::size_t>(m);
+  const std::size_t floats = count * (keepMatrices_ ? count + 1 : 1);
+  // The entries never outgrow their reserved room, so none of them moves.
+  if (g.entries.size() == maxEntries_ || g.cellsUsed + count > cellsRoom_ ||
+      g.valuesUsed + floats > valuesRoom_) {
+    return nullptr;
+  }
+  KeptInverse& e = g.entries.emplace_back();
+  e.count = m;
+  e.hash = hash;
+  e.cells = g.cells.get() + g.cellsUsed;
+  std::copy(cells, cells + m, e.cells);
+  g.cellsUsed += count;
+  e.products = g.values.get() + g.valuesUsed;
+  e.inverse = keepMatrices_ ? e.products + m : nullptr;
+  g.valuesUsed += floats;
+  const std::size_t mask = g.slots.size() - 1;
+  std::size_t at = hash & mask;
+  while (g.slots[at] != 0) at = (at + 1) & mask;
+  g.slots[at] = static_cast<std::uint32_t>(g.entries.size());
+  return &e;
+}
+
+KeptInverse* InverseCache::find(const std::int32_t* cells, std::int32_t m) {
+  if (last_ != nullptr && sameCells(*last_, cells, m)) {
+    ++reused;
+    return last_;
+  }
+  const std::uint64_t hash = cellsHash(cells, m);
+  KeptInverse* found = lookUp(generations_[current_], cells, m, hash);
+  if (found == nullptr) {
+    KeptInverse* earlier = lookUp(generations_[current_ ^ 1], cells, m, hash);
+    if (earlier == nullptr) return nullptr;
+    // Carried over into this line, so that the next line still finds it.
+    found = earlier;
+    if (KeptInverse* carried = add(generations_[current_], cells, m, hash)) {
+      carried->result = earlier->result;
+      carried->errorText = earlier->errorText;
+      carried->mean = earlier->mean;
+      carried->hasEntrySum = earlier->hasEntrySum;
+      carried->entrySum = earlier->entrySum;
+      const std::size_t floats =
+          static_cast<std::size_t>(m) * (keepMatrices_ ? static_cast<std::size_t>(m) + 1 : 1);
+      std::copy(earlier->products, earlier->products + floats, carried->products);
+      found = carried;
+    }
+  }
+  last_ = found;
+  ++reused;
+  return found;
+}
+
+KeptInverse* InverseCache::keep(const std::int32_t* cells, std::int32_t m, std::int32_t result,
+                                const char* reason) {
+  KeptInverse* e = add(generations_[current_], cells, m, cellsHash(cells, m));
+  last_ = e;
+  if (e == nullptr) return nullptr;
+  e->result = result;
+  e->errorText = reason;
+  return e;
 }
 
 std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSettings& settings,
@@ -144,24 +266,39 @@ std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSe
   }
   float mean = 0.0f;
   const float* products = ws.rowProducts;  // row i of the inverse times the values less the mean
-  if (cache != nullptr && cache->holds(ws.selIndex, m)) {
-    // The same cells have the same values: the mean and the row products of
-    // the kept inverse stand as they were.
-    ws.errorText = cache->errorText;
-    if (cache->result != 0) return -1;
-    mean = cache->mean;
+  const std::int64_t stride = ws.limit;
+  KeptInverse* hit = cache != nullptr ? cache->find(ws.selIndex, m) : nullptr;
+  if (hit != nullptr) {
+    ws.errorText = hit->errorText;
+    if (hit->result != 0) return -1;
+    mean = hit->mean;
     for (std::int32_t i = 0; i < m; ++i) ws.selValue[i] = ws.selValue[i] - mean;
-    products = cache->products;
+    products = hit->products;
+    cache->used = hit->inverse;
+    cache->usedStride = m;
+    cache->usedEntry = hit;
   } else {
     const std::int32_t inverted = buildCorrelationMatrix(ws, m, settings);
-    if (cache != nullptr) cache->keep(ws.selIndex, m, inverted, ws.errorText);
+    KeptInverse* kept = nullptr;
+    if (cache != nullptr) {
+      kept = cache->keep(ws.selIndex, m, inverted, ws.errorText);
+      cache->used = ws.matrix;
+      cache->usedStride = stride;
+      cache->usedEntry = kept;
+    }
     if (inverted != 0) return -1;
     float weightSum = 0.0f;
     removeWeightedMean(ws, ws.matrix, ws.selValue, m, mean, weightSum);
     floatRowSums(ws.matrix, ws.limit, ws.selValue, m, m, nullptr, ws.rowProducts);
-    if (cache != nullptr) {
-      cache->mean = mean;
-      std::copy(ws.rowProducts, ws.rowProducts + m, cache->products);
+    if (kept != nullptr) {
+      kept->mean = mean;
+      std::copy(ws.rowProducts, ws.rowProducts + m, kept->products);
+      if (kept->inverse != nullptr) {
+        for (std::int32_t i = 0; i < m; ++i) {
+          std::copy(ws.matrix + i * stride, ws.matrix + i * stride + m,
+                    kept->inverse + i * std::int64_t{m});
+        }
+      }
     }
   }
 

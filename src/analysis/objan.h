@@ -2,29 +2,82 @@
 #define KARNET_ANALYSIS_OBJAN_H_
 
 #include <cstdint>
+#include <memory>
+#include <vector>
 
 #include "analysis/workspace.h"
 #include "params/run_settings.h"
 
 namespace karnet {
 
-// The inverted matrix of the last estimate of one thread, known by the ordered
-// list of data cells it was made from. Two nodes that choose the same cells in
-// the same order have the very same matrix, and so the same inverse.
-struct InverseCache {
-  std::int32_t* chosen = nullptr;  // room for limit indices
-  std::int32_t count = -1;         // cells of the kept inverse; -1: none kept
+// What one inversion left for later nodes that choose the same cells in the
+// same order: those have the very same matrix, and so the same inverse, and
+// (the same cells having the same values) the same weighted mean and row
+// products.
+struct KeptInverse {
+  std::int32_t count = 0;          // cells
   std::int32_t result = 0;         // what the inversion gave (0 or -1)
   const char* errorText = "";      // and the reason it left
-  // For a successful inverse, what the cells' values make of it (the same
-  // cells have the same values): their weighted mean and the products of the
-  // inverse's rows with the values less that mean.
-  float mean = 0.0f;
-  float* products = nullptr;  // room for limit values
+  std::uint64_t hash = 0;          // of the ordered cell list
+  float mean = 0.0f;               // weighted mean of the values (success only)
+  std::int32_t* cells = nullptr;   // count indices
+  float* products = nullptr;       // count row products with the values less the mean
+  float* inverse = nullptr;        // count x count, rows of count; null unless kept
+  bool hasEntrySum = false;        // entrySum made (by the first error variance)
+  double entrySum = 0.0;           // the inverse's entry sum (inverseEntrySum)
+};
 
-  bool holds(const std::int32_t* cells, std::int32_t m) const;
-  void keep(const std::int32_t* cells, std::int32_t m, std::int32_t inverted,
-            const char* reason);
+// The inverses one thread made on the line of nodes it is walking and on the
+// line before: neighbouring nodes of the two lines mostly choose the same
+// cells. Entries of older lines are dropped as a new line starts; an entry
+// that the new line uses again is carried over. Room is reserved for a line's
+// nodes; what does not fit is simply not kept.
+class InverseCache {
+ public:
+  // limit: the most cells of an estimate; lineNodes: the nodes of a line;
+  // keepMatrices: each inverse is kept too (for the error variances).
+  InverseCache(std::int32_t limit, std::int64_t lineNodes, bool keepMatrices);
+  InverseCache(const InverseCache&) = delete;
+  InverseCache& operator=(const InverseCache&) = delete;
+
+  // The next line begins: entries made before the line just ended go.
+  void startLine();
+  // The kept inverse of exactly these cells in this order, or null.
+  KeptInverse* find(const std::int32_t* cells, std::int32_t m);
+  // Room for the inverse of these cells (cells, count, result and reason set;
+  // the caller fills mean, products and inverse), or null when there is none.
+  KeptInverse* keep(const std::int32_t* cells, std::int32_t m, std::int32_t result,
+                    const char* reason);
+  bool keepsMatrices() const { return keepMatrices_; }
+  // Where the inverse of the last successful estimate is (when matrices are
+  // kept): the workspace's matrix or a kept one, rows usedStride apart.
+  const float* used = nullptr;
+  std::int64_t usedStride = 0;
+  KeptInverse* usedEntry = nullptr;  // its entry, null when it was not kept
+  std::int64_t reused = 0;  // estimates that took a kept inverse
+
+ private:
+  struct Generation {
+    std::vector<KeptInverse> entries;
+    std::unique_ptr<std::int32_t[]> cells;
+    std::unique_ptr<float[]> values;
+    std::size_t cellsUsed = 0;
+    std::size_t valuesUsed = 0;
+    std::vector<std::uint32_t> slots;  // entry index + 1, 0 when free
+  };
+  KeptInverse* add(Generation& g, const std::int32_t* cells, std::int32_t m,
+                   std::uint64_t hash);
+  KeptInverse* lookUp(Generation& g, const std::int32_t* cells, std::int32_t m,
+                      std::uint64_t hash);
+
+  std::int32_t limit_;
+  bool keepMatrices_;
+  std::size_t maxEntries_;
+  std::size_t cellsRoom_;   // per generation
+  std::size_t valuesRoom_;  // per generation
+  KeptInverse* last_ = nullptr;
+  Generation generations_[2];
+  int current_ = 0;
 };
 
 // Optimal-interpolation estimate from the m cells chosen by selectData
@@ -34,9 +87,9 @@ struct InverseCache {
 // success; returns -1 and leaves *estimate alone on failure, with ws.errorText
 // naming the reason. ws.selValue is left with the mean removed.
 // With a cache, the matrix is not built and inverted again when the chosen
-// cells (ws.selIndex[0..m-1]) are those of the cache's inverse, which must
-// then still be in ws.matrix, and the mean and row products are the kept
-// ones; the estimate is the same bit for bit.
+// cells (ws.selIndex[0..m-1]) are those of a kept inverse: the mean and row
+// products are the kept ones, and the estimate is the same bit for bit. When
+// the cache keeps matrices, cache->used points to the inverse used.
 std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSettings& settings,
                    InverseCache* cache = nullptr);
 

@@ -67,13 +67,14 @@ void recordErrorVariance(FloatGrid3D& field, float e, std::int64_t p, std::int64
 // The storage of one thread's estimates: the candidate and chosen-cell arrays
 // and sort keys, the matrix and the pivot records, the selection's window,
 // column cursors and row reaches (carried from node to node along the thread's own
-// walk), and the inverse it last computed. It works on a copy of the layer's
+// walk), and the inverses it made on its current and previous line. It works on a copy of the layer's
 // workspace whose per-node arrays point here; the layer's data cells, column
 // index and correlation table stay shared and are only read.
 class NodeScratch {
  public:
-  explicit NodeScratch(const OaWorkspace& layer)
+  NodeScratch(const OaWorkspace& layer, std::int64_t lineNodes, bool keepMatrices)
       : ws(layer),
+        inverse(layer.limit, lineNodes, keepMatrices),
         candIndex_(entries(layer.dataCapacity)),
         candCorr_(entries(layer.dataCapacity)),
         candKey_(entries(layer.dataCapacity)),
@@ -90,9 +91,7 @@ class NodeScratch {
         matrix_(entries(std::int64_t{layer.limit} * layer.limit)),
         rowSums_(entries(layer.limit)),
         rowProducts_(entries(layer.limit)),
-        pivot_(entries(oaPivotEntries(layer.limit))),
-        chosen_(entries(layer.limit)),
-        kept_(entries(layer.limit)) {
+        pivot_(entries(oaPivotEntries(layer.limit))) {
     ws.candIndex = candIndex_.data();
     ws.candCorr = candCorr_.data();
     ws.candKey = candKey_.data();
@@ -114,8 +113,6 @@ class NodeScratch {
     ws.rowSums = rowSums_.data();
     ws.rowProducts = rowProducts_.data();
     ws.pivot = pivot_.data();
-    inverse.chosen = chosen_.data();
-    inverse.products = kept_.data();
   }
   NodeScratch(const NodeScratch&) = delete;
   NodeScratch& operator=(const NodeScratch&) = delete;
@@ -140,8 +137,6 @@ class NodeScratch {
   std::vector<float> matrix_;
   std::vector<float> rowSums_, rowProducts_;
   std::vector<std::int32_t> pivot_;
-  std::vector<std::int32_t> chosen_;
-  std::vector<float> kept_;
 };
 
 }  // namespace
@@ -184,28 +179,33 @@ std::int32_t analyseLayer(OaWorkspace& ws, FloatGrid2D& grid, std::int32_t nData
   collectDataCells(ws, grid, nData, deleteValue, team.messages);
   workspaceIndexColumns(ws, nj);
 
-  // Lines of constant j go to the threads of the team; within a line the
-  // nodes follow k upwards, so that neighbouring nodes, which mostly choose the
-  // same cells, meet the same thread one after the other.
+  // Lines of constant j go to the threads of the team a few neighbouring lines
+  // at a time; within a line the nodes follow k upwards, so that neighbouring
+  // nodes, which mostly choose the same cells, meet the same thread one after
+  // the other, and a line finds the inverses of the line before.
   std::int32_t successes = 0;
   std::int32_t failed = 0;
   WorkProgress* progress = team.progress;
   const std::int64_t lineNodes = std::max<std::int64_t>(std::int64_t{kLast} - input.kOff + 1, 0);
   const OaWorkspace& layer = ws;
+  const std::int64_t lines = std::max(jLast - input.jOff + 1, 1);
+  const auto linesPerTurn = static_cast<std::int32_t>(
+      std::max<std::int64_t>(1, lines / (16 * std::int64_t{std::max(team.threads, 1)})));
   std::exception_ptr error;
 #pragma omp parallel num_threads(team.threads) if (team.threads > 1) \
     reduction(+ : successes, failed)
   {
     std::optional<NodeScratch> scratch;
     try {
-      scratch.emplace(layer);
+      scratch.emplace(layer, lineNodes, input.errorField != nullptr);
     } catch (...) {
 #pragma omp critical(karnet_layer_error)
       if (error == nullptr) error = std::current_exception();
     }
-#pragma omp for schedule(dynamic, 1)
+#pragma omp for schedule(dynamic, linesPerTurn)
     for (std::int32_t j = input.jOff; j <= jLast; ++j) {
       if (!scratch.has_value() || (progress != nullptr && progress->stopped())) continue;
+      scratch->inverse.startLine();
       for (std::int32_t k = input.kOff; k <= kLast; ++k) {
         const std::int64_t at = std::int64_t{k} * nj + j;
         if (isDryCell(bathymetry.data[at], landValue)) continue;
@@ -214,10 +214,9 @@ std::int32_t analyseLayer(OaWorkspace& ws, FloatGrid2D& grid, std::int32_t nData
         // arrays, not the grid, feed later estimates.
         if (OBJAN(scratch->ws, m, &grid.data[at], settings, &scratch->inverse) == 0) {
           ++successes;
-          // The inverse the estimate used is still in the matrix, cached or not.
           if (input.errorField != nullptr) {
-            recordErrorVariance(*input.errorField, estimateErrorVariance(scratch->ws, m),
-                                j - input.jOff, k - input.kOff, l - input.lOff);
+            recordErrorVariance(*input.errorField, estimateErrorVariance(scratch->ws, scratch->inverse, m), j - input.jOff,
+                                k - input.kOff, l - input.lOff);
           }
         } else {
           ++failed;

@@ -8,7 +8,7 @@ namespace {
 // Rows i .. i + R - 1: each row's sums over its columns in turn, the rows of
 // the block worked on side by side so that their chains of additions overlap
 // instead of waiting on one another.
-template <int R, bool WithSums, typename Sum>
+template <int R, bool WithProducts, bool WithSums, typename Sum>
 inline void rowBlock(const float* a, std::int64_t stride, const float* values, std::int32_t i,
                      std::int32_t columns, Sum* products, Sum* sums) {
   Sum product[R] = {};
@@ -17,26 +17,28 @@ inline void rowBlock(const float* a, std::int64_t stride, const float* values, s
     const auto v = static_cast<Sum>(values[j]);
     for (int r = 0; r < R; ++r) {
       const auto x = static_cast<Sum>(a[(i + r) * stride + j]);
-      product[r] = product[r] + x * v;
+      if constexpr (WithProducts) product[r] = product[r] + x * v;
       if constexpr (WithSums) sum[r] = sum[r] + x;
     }
   }
   for (int r = 0; r < R; ++r) {
-    products[i + r] = product[r];
+    if constexpr (WithProducts) products[i + r] = product[r];
     if constexpr (WithSums) sums[i + r] = sum[r];
   }
 }
 
 constexpr int kBlock = 4;
 
-template <bool WithSums, typename Sum>
+template <bool WithProducts, bool WithSums, typename Sum>
 void rowSums(const float* a, std::int64_t stride, const float* values, std::int32_t rows,
              std::int32_t columns, Sum* products, Sum* sums) {
   std::int32_t i = 0;
   for (; i + kBlock <= rows; i += kBlock) {
-    rowBlock<kBlock, WithSums>(a, stride, values, i, columns, products, sums);
+    rowBlock<kBlock, WithProducts, WithSums>(a, stride, values, i, columns, products, sums);
   }
-  for (; i < rows; ++i) rowBlock<1, WithSums>(a, stride, values, i, columns, products, sums);
+  for (; i < rows; ++i) {
+    rowBlock<1, WithProducts, WithSums>(a, stride, values, i, columns, products, sums);
+  }
 }
 
 }  // namespace
@@ -44,15 +46,21 @@ void rowSums(const float* a, std::int64_t stride, const float* values, std::int3
 void floatRowSums(const float* a, std::int64_t stride, const float* values, std::int32_t rows,
                   std::int32_t columns, float* sums, float* products) {
   if (sums == nullptr) {
-    rowSums<false>(a, stride, values, rows, columns, products, sums);
+    rowSums<true, false>(a, stride, values, rows, columns, products, sums);
   } else {
-    rowSums<true>(a, stride, values, rows, columns, products, sums);
+    rowSums<true, true>(a, stride, values, rows, columns, products, sums);
   }
 }
 
 void doubleRowSums(const float* a, std::int64_t stride, const float* values, std::int32_t rows,
                    std::int32_t columns, double* products, double* sums) {
-  rowSums<true>(a, stride, values, rows, columns, products, sums);
+  if (sums == nullptr) {
+    rowSums<true, false>(a, stride, values, rows, columns, products, sums);
+  } else if (products == nullptr) {
+    rowSums<false, true>(a, stride, values, rows, columns, products, sums);
+  } else {
+    rowSums<true, true>(a, stride, values, rows, columns, products, sums);
+  }
 }
 
 }  // namespace karnet

@@ -15,7 +15,8 @@ void floatRowSums(const float* a, std::int64_t stride, const float* values, std:
                   std::int32_t columns, float* sums, float* products);
 
 // In double precision, from the float entries: products[i] = sum of
-// a(i, j) * values[j]; sums[i] = sum of a(i, j).
+// a(i, j) * values[j]; sums[i] = sum of a(i, j). Either of products and sums
+// may be null (then not formed; values is not read without products).
 void doubleRowSums(const float* a, std::int64_t stride, const float* values, std::int32_t rows,
                    std::int32_t columns, double* products, double* sums);
 

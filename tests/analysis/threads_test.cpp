@@ -2,12 +2,14 @@
 // threads, and the kept inverse that spares inversions without changing them.
 #include <gtest/gtest.h>
 
+#include <array>
 #include <cstdint>
 #include <cstring>
 #include <random>
 #include <string>
 #include <vector>
 
+#include "analysis/error_variance.h"
 #include "analysis/objan.h"
 #include "analysis/objective_analysis.h"
 #include "analysis/select_data.h"
@@ -95,13 +97,15 @@ TEST(AnalyseLayerThreads, EveryThreadCountGivesTheSameBits) {
   }
 }
 
-TEST(InverseCache, KeptInverseGivesTheEstimateOfAFreshOne) {
-  // Walk the nodes of a random layer in line order, as a thread does: nodes
-  // that choose the same cells reuse the inverse, others build their own.
-  // Every estimate must equal the one made without the cache, bit for bit.
+TEST(InverseCache, KeptInversesGiveTheEstimatesOfFreshOnes) {
+  // Walk the nodes of a random layer line by line, as a thread does: nodes
+  // that choose the cells of an inverse made on this line or the one before
+  // reuse it, others build their own. Every estimate, failure and error
+  // variance must equal the one made without the cache, bit for bit, also
+  // when the cache has room for a single inverse.
   const RandomLayer layer(17u);
   RunSettings s = layerSettings(0);
-  s.ErrorVariance = 0.0f;
+  s.ErrorVariance = 0.0f;  // some matrices fail: failures are kept too
   std::vector<std::array<float, 3>> cells;
   for (std::int32_t j = 0; j < RandomLayer::nj; ++j) {
     for (std::int32_t k = 0; k < RandomLayer::nk; ++k) {
@@ -110,33 +114,49 @@ TEST(InverseCache, KeptInverseGivesTheEstimateOfAFreshOne) {
     }
   }
   const auto n = static_cast<std::int32_t>(cells.size());
-  testing::ScopedWorkspace cached(n, RandomLayer::nj, RandomLayer::nk, s);
-  testing::ScopedWorkspace fresh(n, RandomLayer::nj, RandomLayer::nk, s);
-  cached.setCells(cells);
-  fresh.setCells(cells);
-  std::vector<std::int32_t> chosen(static_cast<std::size_t>(s.CorrelationSampleSize));
-  std::vector<float> products(chosen.size());
-  InverseCache cache;
-  cache.chosen = chosen.data();
-  cache.products = products.data();
-  int reused = 0, estimates = 0;
-  for (std::int32_t j = 0; j < RandomLayer::nj; ++j) {
-    for (std::int32_t k = 0; k < RandomLayer::nk; ++k) {
-      const std::int32_t m = selectData(cached.ws, j, k, s);
-      ASSERT_EQ(selectData(fresh.ws, j, k, s), m);
-      const bool same = cache.holds(cached.ws.selIndex, m);
-      float a = -7.0f, b = -7.0f;
-      const std::int32_t ra = OBJAN(cached.ws, m, &a, s, &cache);
-      const std::int32_t rb = OBJAN(fresh.ws, m, &b, s);
-      ASSERT_EQ(ra, rb) << j << "," << k;
-      ASSERT_EQ(std::memcmp(&a, &b, sizeof a), 0) << j << "," << k << ": " << a << " " << b;
-      reused += same ? 1 : 0;
-      estimates += ra == 0 ? 1 : 0;
+  std::vector<int> foundAgain;
+  for (const std::int64_t lineNodes : {std::int64_t{RandomLayer::nk}, std::int64_t{0}}) {
+    SCOPED_TRACE(::testing::Message() << "room for " << lineNodes + 1 << " inverses");
+    testing::ScopedWorkspace cached(n, RandomLayer::nj, RandomLayer::nk, s);
+    testing::ScopedWorkspace fresh(n, RandomLayer::nj, RandomLayer::nk, s);
+    cached.setCells(cells);
+    fresh.setCells(cells);
+    InverseCache cache(s.CorrelationSampleSize, lineNodes, true);
+    std::vector<std::int32_t> previous;
+    int fromEarlierNodes = 0, failures = 0, estimates = 0;
+    for (std::int32_t j = 0; j < RandomLayer::nj; ++j) {
+      cache.startLine();
+      for (std::int32_t k = 0; k < RandomLayer::nk; ++k) {
+        const std::int32_t m = selectData(cached.ws, j, k, s);
+        ASSERT_EQ(selectData(fresh.ws, j, k, s), m);
+        const std::vector<std::int32_t> chosen(cached.ws.selIndex, cached.ws.selIndex + m);
+        const std::int64_t reusedBefore = cache.reused;
+        float a = -7.0f, b = -7.0f;
+        const std::int32_t ra = OBJAN(cached.ws, m, &a, s, &cache);
+        const std::int32_t rb = OBJAN(fresh.ws, m, &b, s);
+        ASSERT_EQ(ra, rb) << j << "," << k;
+        ASSERT_EQ(std::memcmp(&a, &b, sizeof a), 0) << j << "," << k << ": " << a << " " << b;
+        if (cache.reused > reusedBefore && chosen != previous) ++fromEarlierNodes;
+        previous = chosen;
+        if (ra != 0) {
+          ASSERT_STREQ(cached.ws.errorText, fresh.ws.errorText);
+          ++failures;
+          continue;
+        }
+        ++estimates;
+        const float ea = estimateErrorVariance(cached.ws, cache, m);
+        const float eb = estimateErrorVariance(fresh.ws, m);
+        ASSERT_EQ(std::memcmp(&ea, &eb, sizeof ea), 0) << j << "," << k << ": " << ea << " " << eb;
+      }
     }
+    EXPECT_GT(failures, 0);
+    EXPECT_LT(cache.reused, estimates + failures);
+    foundAgain.push_back(fromEarlierNodes);
   }
-  // The walk does reuse inverses, and not for every node.
-  EXPECT_GT(reused, 30);
-  EXPECT_LT(reused, estimates);
+  // With room for a line, inverses are found again well beyond the node right
+  // before; with room for one, hardly.
+  EXPECT_GT(foundAgain[0], 30);
+  EXPECT_LT(foundAgain[1] * 3, foundAgain[0]);
 }
 
 TEST(ObjectiveAnalysisThreads, WholePassIsTheSameForAnyThreadCount) {
