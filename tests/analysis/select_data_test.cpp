@@ -32,16 +32,11 @@ RunSettings shortRange(std::int32_t limit, float radius = 100.0f) {
   return s;
 }
 
-TEST(Correlation, OneAtZeroZeroAtCrossingAndCutBeyondForty) {
-  ScopedWorkspace w(0, 20, 20, shortRange(1));
-  EXPECT_EQ(correlation(0.0f, w.ws), 1.0f);
-  EXPECT_EQ(correlation(9.0f, w.ws), 0.0f);  // the zero crossing
-  EXPECT_NEAR(correlation(4.0f, w.ws), std::exp(-2.0) * (1.0 - 4.0 / 9.0), 1e-7);
-  EXPECT_LT(correlation(80.0f, w.ws), 0.0f);  // evaluated up to 40 * decay2
-  EXPECT_EQ(correlation(80.5f, w.ws), 0.0f);  // cut beyond it
-
-  // The table gives the very bits of the model, also where the model gives
-  // not-a-number (at the node) and -inf (beyond it) for a zero crossing at 0.
+// The model's values against its closed form are checked with the estimator's
+// numerics; here the table that stands in for it.
+TEST(Correlation, TableGivesTheBitsOfTheModel) {
+  // The very bits, also where the model gives not-a-number (at the node) and
+  // -inf (beyond it) for a zero crossing at 0.
   for (const float zero : {8.0f, 0.0f}) {
     RunSettings s = testing::withLimit(8);
     s.ZeroCrossingDistance = zero;

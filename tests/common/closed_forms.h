@@ -87,12 +87,10 @@ struct Field {
 };
 
 // One twelve-point smoothing: 4 x centre plus the eight neighbours (indices
-// clamped into the field, holes replaced by the centre), over 12. With
-// inPlace the nodes are visited column by column (j outer) and read the values
-// already smoothed; otherwise every node reads the field as it was.
-inline void twelvePoint(Field& f, bool inPlace) {
-  const Field before = f;
-  const Field& src = inPlace ? f : before;
+// clamped into the field, holes replaced by the centre), over 12, every node
+// reading the field as it was.
+inline void twelvePoint(Field& f) {
+  const Field src = f;
   for (int j = 0; j < f.nj; ++j) {
     for (int k = 0; k < f.nk; ++k) {
       const double z = src.at(j, k);

@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "e2e/e2e_support.h"
+#include "gridfile/nc_test_files.h"
 
 namespace karnet::e2e {
 namespace {
@@ -22,15 +23,6 @@ namespace {
 namespace fs = std::filesystem;
 
 constexpr char kEarlierResult[] = "an earlier result, to be kept\n";
-
-// Writes a NetCDF file from CDL text with ncgen (kind: classic, nc4, ...).
-void ncgen(const std::string& path, const std::string& cdl, const std::string& kind = "nc4") {
-  const std::string cdlPath = path + ".cdl";
-  writeFile(cdlPath, cdl);
-  const std::string command = "ncgen -k " + kind + " -o '" + path + "' '" + cdlPath + "'";
-  if (std::system(command.c_str()) != 0) throw std::runtime_error("ncgen failed: " + cdl);
-  fs::remove(cdlPath);
-}
 
 // A bathymetry in the layout karnet reads, with the item's declaration and the data section
 // given by the caller; dimensions y and x of the given sizes (0: unlimited, left empty).
@@ -74,6 +66,7 @@ void uniformBathymetry(const TempDir& d, float height) {
   writeBathymetry(d.file("bathymetry.nc"), localBasin(30, 24, 250.0, height));
 }
 
+using test::ncgen;
 using P = ParameterFile&;
 using D = const TempDir&;
 using Spoil = std::function<void(D)>;
@@ -109,12 +102,6 @@ Spoil directoryAt(const std::string& name) {
   return [=](D d) {
     fs::remove(d.file(name));
     fs::create_directory(d.file(name));
-  };
-}
-Spoil devZeroAt(const std::string& name) {
-  return [=](D d) {
-    fs::remove(d.file(name));
-    fs::create_symlink("/dev/zero", d.file(name));
   };
 }
 Spoil fifoAt(const std::string& name) {
@@ -186,50 +173,20 @@ std::vector<BadInput> parameterFileRows() {
        1, noTarget},
       {"block never closed", {}, swapIn("case.pfs", "EndSect  // OUTPUT_DATA", ""), 1,
        "is not closed (EndSect missing)"},
-      {"EndSect without a block", {}, text("case.pfs", "EndSect\n"), 1,
-       "EndSect without an open block"},
-      {"keyword outside any block", {}, text("case.pfs", "Spacing = 2\n"), 1,
-       "outside of any block"},
-      {"NUL byte", {}, swapIn("case.pfs", "Title", std::string("Ti\0tle", 6)), 1,
-       "NUL byte in the line"},
       {"huge float", [](P p) { p.spacing = "1e39"; }, {}, 1, "not a number within the float range"},
-      {"huge double", [](P p) { p.searchRadius = "1e400"; }, {}, 1,
-       "not a number within the float range"},
-      {"huge integer", [](P p) { p.zRange = "0, 99999999999"; }, {}, 1,
-       "not an integer within 32 bits"},
       {"NaN as a word", [](P p) { p.spacing = "NaN"; }, {}, 1, "(the word NaN) is not a number"},
       {"nan as a text", [](P p) { p.decayDistance = "'nan'"; }, {}, 1, "is not a number"},
       {"inf as a word", [](P p) { p.searchRadius = "inf"; }, {}, 1, "(the word inf) is not a number"},
-      {"integer with a fraction", [](P p) { p.itemType = "2.5"; }, {}, 1, "is not an integer"},
-      {"one value for a pair", [](P p) { p.zRange = "3"; }, {}, 1, "has 1 value, 2 expected"},
-      {"unterminated quote", [](P p) { p.title = "'no end"; }, {}, 1, "unterminated text"},
       {"unterminated bar", [](P p) { p.outputFileName = "|result.nc"; }, {}, 1,
        "unterminated file name"},
-      {"file name too long", [](P p) { p.dataFileName = "|" + std::string(300, 'a') + "|"; }, {},
-       1, "at most 259 are allowed"},
       {"projection too long", [](P p) { p.projection = "'" + std::string(1100, 'p') + "'"; }, {},
        1, "at most 1023 are allowed"},
-      {"missing keyword", {}, swapIn("case.pfs", "Spacing = 2.5", ""), 1,
-       "keyword Spacing not found"},
-      {"missing section", [](P p) { p.omit = {"OUTPUT_DATA"}; }, {}, 1,
-       "section [OUTPUT_DATA] not found"},
-      {"other target name", {}, swapIn("case.pfs", "[Q4_DIGITIZING_OF_DATA]", "[Q5]"), 1,
-       noTarget},
       {"parameter file is a directory", {}, directoryAt("case.pfs"), 1, "Can't open case.pfs"},
       {"keyword with a bad value, named with its line", [](P p) { p.spacing = "abc"; }, {}, 1,
        "(the word abc) is not a number",
        "case.pfs:11: keyword Spacing: parameter 1 (the word abc) is not a number"},
-      {"parameter file is /dev/zero", {}, devZeroAt("case.pfs"), 1, notRegular},
       {"parameter file is a FIFO", {}, fifoAt("case.pfs"), 1, notRegular},
-      {"parameter file larger than 64 MiB", {},
-       [](D d) { fs::resize_file(d.file("case.pfs"), (std::uintmax_t{64} << 20) + 1); }, 1,
-       "Can't open case.pfs (larger than"},
       {"CR LF line ends", {}, crlf("case.pfs"), 0, kSuccess, "", kResult},
-      {"byte order mark", {},
-       [](D d) { writeFile(d.file("case.pfs"), "\xEF\xBB\xBF" + readFile(d.file("case.pfs"))); },
-       0, kSuccess, "", kResult},
-      {"level range beyond memory", [](P p) { p.zRange = "0, 2000000000"; }, {}, 1,
-       "ERROR: Unable to allocate memory"},
   };
 }
 
@@ -271,8 +228,6 @@ std::vector<BadInput> settingRows() {
 std::vector<BadInput> observationRows() {
   const std::string waterError = "\nERROR while reading water file\n      line number: ";
   return {
-      {"NUL byte inside a line", {}, insertObs(0, std::string("1500 2500 -2\0 4\n", 16)), 1,
-       waterError + "1\n"},
       // The bytes after a NUL must not join the next line into a false observation.
       {"NUL byte hides a line end", {}, insertObs(0, std::string("1500 2500\0 junk\n-2 4\n", 21)),
        1, waterError + "1\n"},
@@ -283,20 +238,13 @@ std::vector<BadInput> observationRows() {
        kResult},
       {"inf", {}, insertObs(0, "1500 inf -2 4\n"), 1, waterError + "1\n",
        "observations.txt:1: not a finite number: \"inf\""},
-      {"-infinity", {}, insertObs(0, "1500 2500 -infinity 4\n"), 1, waterError + "1\n"},
       {"nan", {}, insertObs(6, "1500 3000 -2 nan\n"), 1, waterError + "7\n"},
-      {"number beyond double", {}, insertObs(0, "1e999 2500 -2 4\n"), 1, waterError + "1\n"},
       {"1e308", {}, insertObs(-1, "1e308 2500 -2 4\n"), 1, "\nERROR: basic grid too large\n"},
       {"-1e308 depth", {}, insertObs(-1, "1500 2500 -1e308 4\n"), 1,
        "\nERROR: basic grid too large\n"},
       {"three numbers", {}, insertObs(6, "1500 3000 -2\n"), 1, waterError + "7\n",
        "observations.txt:7: 4 numbers expected (x y z value), found 3"},
       {"blank line", {}, insertObs(6, "\n"), 1, waterError + "7\n", "observations.txt:7: empty line"},
-      {"header line", {}, insertObs(0, "x y z temperature\n"), 1, waterError + "1\n",
-       "observations.txt:1: not a number: \"x\""},
-      {"binary observation file", {},
-       text("observations.txt", std::string("\x7f" "ELF\x02\x01\x01\0\0\0", 10)), 1,
-       waterError + "1\n"},
       {"empty observation file", {}, text("observations.txt", ""), 0, kSuccess, "", kResult},
       {"all observations far outside", {}, text("observations.txt", "5e6 5e6 -2 4\n5e6 5e6 -4 3\n"),
        1, "\nERROR: basic grid too large\n"},
@@ -318,8 +266,6 @@ std::vector<BadInput> observationRows() {
       {"observation file is a directory", {}, directoryAt("observations.txt"), 1,
        "ERROR: in input file selection", "observations.txt: is a directory, not a regular file"},
       {"observation file is a FIFO", {}, fifoAt("observations.txt"), 1,
-       "ERROR: in input file selection", "observations.txt: not a regular file"},
-      {"observation file is /dev/zero", {}, devZeroAt("observations.txt"), 1,
        "ERROR: in input file selection", "observations.txt: not a regular file"},
   };
 }
@@ -423,8 +369,6 @@ std::vector<BadInput> bathymetryRows() {
        "ERROR: in input file selection", "", kAtEcho},
       {"bathymetry is a FIFO", {}, fifoAt("bathymetry.nc"), 1, "ERROR: in input file selection",
        "bathymetry.nc: not a regular file"},
-      {"bathymetry is a directory", {}, directoryAt("bathymetry.nc"), 1,
-       "ERROR: in input file selection", "bathymetry.nc: is a directory, not a regular file"},
   };
 }
 
@@ -469,7 +413,6 @@ std::map<std::string, std::string> snapshot(const TempDir& dir) {
   std::map<std::string, std::string> files;
   for (const auto& entry : fs::recursive_directory_iterator(dir.path())) {
     if (entry.is_symlink() || !entry.is_regular_file()) continue;
-    if (entry.file_size() > (std::uintmax_t{16} << 20)) continue;  // the sparse 64 MiB file
     files[fs::relative(entry.path(), dir.path()).string()] = readFile(entry.path().string());
   }
   return files;
@@ -534,8 +477,7 @@ TEST(BadInput, ParameterFiles) {
   for (BadInput row : parameterFileRows()) {
     // What the log says about a parameter file that cannot be read is also on the standard
     // error stream (the rows named in parameterFileRows give the whole line).
-    if (row.exitCode == 1 && row.stderrText.empty() &&
-        row.logText != "ERROR: Unable to allocate memory") {
+    if (row.exitCode == 1 && row.stderrText.empty()) {
       row.stderrText = row.logText;
     }
     runRow(row);

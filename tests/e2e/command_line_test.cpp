@@ -151,8 +151,6 @@ TEST(RunSummary, QuietRunSaysNothingButTheErrorThatStopsIt) {
     EXPECT_EQ(r.exitCode, 0) << args[0];
     EXPECT_EQ(r.err, "") << args[0];
   }
-  // Not after it: the usage is broken.
-  EXPECT_EQ(runKarnet({"case.pfs", "--quiet"}, dir.path(), kBatch).exitCode, 1);
   writeFile(dir.file("observations.txt"), "500 500 -10 5\n500 500 -10\n");
   const ProcessResult bad = runKarnet({"--quiet", "case.pfs"}, dir.path(), kBatch);
   EXPECT_EQ(bad.exitCode, 1);

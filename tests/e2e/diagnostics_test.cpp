@@ -56,33 +56,6 @@ TEST(ErrorField, ObjectiveAnalysisWritesItBesideTheItem) {
   EXPECT_TRUE(readVariable(dir.file("result.nc"), "Temperature_error").empty());
 }
 
-TEST(ErrorField, RisesTowardsOneAwayFromTheData) {
-  TempDir dir;
-  ParameterFile p = objectiveCase();
-  p.searchRadius = "10000";
-  writeSmallCase(dir, p);
-  // Casts only in the west: x nodes 1 and 3, rows 4 and 8.
-  std::ostringstream obs;
-  for (int j : {4, 8}) {
-    for (int i : {1, 3}) {
-      for (double z = -0.5; z > -12.0; z -= 1.5) {
-        obs << 1000.0 + i * 250.0 << ' ' << 2000.0 + j * 250.0 << ' ' << z << ' '
-            << 8.0 + 0.4 * z << '\n';
-      }
-    }
-  }
-  writeFile(dir.file("observations.txt"), obs.str());
-  ASSERT_EQ(runCase(dir).exitCode, 0);
-  const std::vector<double> errors = readVariable(dir.file("result.nc"), "Temperature_error");
-  ASSERT_EQ(errors.size(), 12u * 24u * 30u);
-  // Along row 6 of the top level, from between the casts towards the east.
-  const double* row = errors.data() + (11 * 24 + 6) * 30;
-  EXPECT_LT(row[2], 0.2);
-  for (int i = 3; i < 20; ++i) EXPECT_GE(row[i], row[i - 1]) << "node " << i;
-  EXPECT_GT(row[8], 2.0 * row[2]);
-  EXPECT_EQ(row[20], 1.0);
-}
-
 // The rows of a CSV file, fields split.
 std::vector<std::vector<std::string>> readCsv(const std::string& path) {
   std::vector<std::vector<std::string>> rows;

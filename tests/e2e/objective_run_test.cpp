@@ -79,7 +79,7 @@ TEST(ObjectiveRun, EveryWetNodeIsTheSmoothedClippedEstimate) {
     }
     for (int a = 0; a < std::stoi(c.operations); ++a) {
       if (c.twelvePoint) {
-        reference::twelvePoint(expected, false);
+        reference::twelvePoint(expected);
       } else {
         reference::shapiro(expected, 8);
       }

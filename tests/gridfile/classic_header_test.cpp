@@ -26,12 +26,7 @@ class ClassicHeaderTest : public test::ScratchTest {
   }
 
   std::string made(const std::string& kind, const std::string& cdl) {
-    test::writeBytes(file("source.cdl"), cdl);
-    int code = 0;
-    const std::string out = test::commandOutput(
-        "ncgen -k " + kind + " -o '" + file(kind + ".nc") + "' '" + file("source.cdl") + "' 2>&1",
-        &code);
-    EXPECT_EQ(code, 0) << out;
+    test::ncgen(file(kind + ".nc"), cdl, kind);
     return test::readBytes(file(kind + ".nc"));
   }
 };

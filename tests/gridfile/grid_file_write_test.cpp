@@ -1,5 +1,6 @@
-// Writing gridded files: the layout of a written file, refused settings, and
-// files that appear under their name only when complete.
+// Writing gridded files: the layout of a written file, refused settings, files
+// that appear under their name only when complete, and the georeferenced layout
+// of a result (depth axis, x and y, lon and lat row by row, the CF grid mapping).
 #include <gtest/gtest.h>
 #include <netcdf.h>
 #include <sys/stat.h>
@@ -7,14 +8,17 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <cmath>
 #include <csignal>
 #include <cstdlib>
 #include <filesystem>
+#include <map>
 #include <string>
 #include <utility>
 #include <vector>
 
 #include "gridfile/grid_file.h"
+#include "gridfile/grid_file_internal.h"
 #include "gridfile/nc_test_files.h"
 
 namespace karnet {
@@ -58,6 +62,11 @@ std::vector<float> ramp(float first = 0.0f) {
   std::vector<float> v(24);
   for (std::size_t i = 0; i < v.size(); ++i) v[i] = first + static_cast<float>(i) * 0.5f;
   return v;
+}
+
+// One step written and the file closed; 0 on success.
+int writeOnce(ResultHeader& r, const std::string& path) {
+  return r.create(path) != 0 || r.write(ramp()) != 0 ? 1 : r.close();
 }
 
 // What ncdump sees in a written file that replaced an earlier one, and the
@@ -278,6 +287,158 @@ TEST_F(GridFileWriteAtomic, EndedRunLeavesEarlierResultAndNoTemporary) {
         << status;
     EXPECT_EQ(test::readBytes(path), kEarlier);
     EXPECT_EQ(entries(), std::vector<std::string>{"test.nc"});
+  }
+}
+
+TEST_F(GridFileWrite, GeoreferenceProjectedGridWithNodePositions) {
+  ResultHeader h("UTM-32");
+  GrdGeoreference g;
+  g.firstDepth = 5.0;
+  g.xFirst = 500000.0;
+  g.yFirst = 6100000.0;
+  g.projectedXY = true;
+  std::vector<int> rows;
+  g.rowGeolocation = [&rows](std::int32_t row, double* lon, double* lat) {
+    rows.push_back(row);
+    for (int i = 0; i < 4; ++i) {
+      lon[i] = 9.0 + 0.25 * i;
+      lat[i] = 55.0 + row;
+    }
+    return true;
+  };
+  g.globalAttributes = {{"title", "a run"}, {"history", "now: karnet case.pfs"}, {"empty", ""}};
+  ASSERT_EQ(grdSetGeoreference(h.header, g), 0);
+  ASSERT_EQ(writeOnce(h, path), 0);
+  EXPECT_EQ(rows, (std::vector<int>{0, 1, 2}));
+
+  const std::string dump = test::ncdump(path, "-v x,y,z,lon,lat");
+  test::expectParts(
+      dump, {"z:standard_name = \"depth\" ;", "z:positive = \"down\" ;", "z:spacing = 2.5 ;",
+             "x:standard_name = \"projection_x_coordinate\" ;",
+             "y:standard_name = \"projection_y_coordinate\" ;",
+             "Temperature:grid_mapping = \"crs\" ;", "Temperature:coordinates = \"lon lat\" ;",
+             "double lon(y, x) ;", "lon:units = \"degrees_east\" ;",
+             "lat:standard_name = \"latitude\" ;",
+             "crs:grid_mapping_name = \"transverse_mercator\" ;", "crs:spatial_ref = \"PROJCS[",
+             ":title = \"a run\" ;", ":history = \"now: karnet case.pfs\" ;",
+             " x = 500000, 500050, 500100, 500150 ;", " y = 6100000, 6100025, 6100050 ;",
+             " z = 5, 2.5 ;", " lon =\n  9, 9.25, 9.5, 9.75,\n  9, 9.25, 9.5, 9.75,",
+             " lat =\n  55, 55, 55, 55,\n  56, 56, 56, 56,\n  57, 57, 57, 57 ;"});
+  EXPECT_EQ(dump.find(":empty"), std::string::npos);
+
+  // lon and lat are coordinates, not items: the file has one item.
+  GrdHeader* read = nullptr;
+  GrdFile* handle = nullptr;
+  ASSERT_EQ(grdFileRead(path.c_str(), &read, &handle), 0);
+  EXPECT_EQ(grdGetNoOfItems(read), 1);
+  grdHeaderDestroy(&read);
+}
+
+TEST_F(GridFileWrite, GeoreferenceTurnedGridIsNotPlacedThroughXAndY) {
+  ResultHeader h("UTM-32");
+  GrdGeoreference g;
+  g.firstDepth = 5.0;
+  g.itemGridMapping = false;
+  g.rowGeolocation = [](std::int32_t, double* lon, double* lat) {
+    for (int i = 0; i < 4; ++i) lon[i] = lat[i] = 1.0;
+    return true;
+  };
+  ASSERT_EQ(grdSetGeoreference(h.header, g), 0);
+  ASSERT_EQ(writeOnce(h, path), 0);
+  const std::string dump = test::ncdump(path, "-v x");
+  test::expectParts(dump, {"distance from the origin node along the grid",
+                           " x = 0, 50, 100, 150 ;", "Temperature:coordinates = \"lon lat\" ;"});
+  EXPECT_EQ(dump.find("Temperature:grid_mapping"), std::string::npos) << dump;
+  EXPECT_EQ(dump.find("projection_x_coordinate"), std::string::npos) << dump;
+}
+
+TEST_F(GridFileWrite, GeoreferenceRefusedAttributesAndFailedPositions) {
+  {
+    ResultHeader h("UTM-32");
+    GrdGeoreference g;
+    g.globalAttributes = {{"Conventions", "CF-1.6"}};
+    EXPECT_NE(grdSetGeoreference(h.header, g), 0);
+    g.globalAttributes = {{"history", "a"}, {"history", "b"}};
+    EXPECT_NE(grdSetGeoreference(h.header, g), 0);
+    g.globalAttributes = {{"Q84_Misc", "clashes with a custom block"}};
+    EXPECT_NE(grdSetGeoreference(h.header, g), 0);
+    g.globalAttributes.clear();
+    g.firstDepth = NAN;
+    EXPECT_NE(grdSetGeoreference(h.header, g), 0);
+  }
+  // Positions that cannot be computed leave no file.
+  ResultHeader h("UTM-32");
+  GrdGeoreference g;
+  g.rowGeolocation = [](std::int32_t row, double*, double*) { return row < 1; };
+  ASSERT_EQ(grdSetGeoreference(h.header, g), 0);
+  EXPECT_NE(grdFileCreate(path.c_str(), h.header, &h.file), 0);
+  EXPECT_TRUE(entries().empty());
+}
+
+// The CF attributes of a projection text, as name -> numbers.
+std::map<std::string, std::vector<double>> cf(const std::string& projection, std::string* name) {
+  std::map<std::string, std::vector<double>> out;
+  name->clear();
+  for (const GrdCfAttribute& a : grdCfGridMapping(projection)) {
+    if (a.name == "grid_mapping_name") {
+      *name = a.text;
+    } else {
+      out[a.name] = a.numbers;
+    }
+  }
+  return out;
+}
+
+TEST(CfGridMapping, ParametersOfTheCommonProjections) {
+  struct Case {
+    const char* projection;
+    const char* name;
+    std::map<std::string, std::vector<double>> expected;
+  };
+  const std::vector<Case> cases = {
+      {"UTM-32", "transverse_mercator",
+       {{"longitude_of_central_meridian", {9}}, {"latitude_of_projection_origin", {0}},
+        {"scale_factor_at_central_meridian", {0.9996}}, {"false_easting", {500000}},
+        {"false_northing", {0}}, {"semi_major_axis", {6378137}},
+        {"inverse_flattening", {298.257223563}}}},
+      {"utm-33s", "transverse_mercator",
+       {{"longitude_of_central_meridian", {15}}, {"false_northing", {10000000}}}},
+      {"+proj=tmerc +lat_0=50 +lon_0=-3 +k=0.9 +x_0=100 +y_0=-200 +ellps=GRS80",
+       "transverse_mercator",
+       {{"latitude_of_projection_origin", {50}}, {"longitude_of_central_meridian", {-3}},
+        {"scale_factor_at_central_meridian", {0.9}}, {"false_easting", {100}},
+        {"false_northing", {-200}}}},
+      {"EPSG:2154", "lambert_conformal_conic",
+       {{"standard_parallel", {49, 44}}, {"latitude_of_projection_origin", {46.5}},
+        {"longitude_of_central_meridian", {3}}, {"false_easting", {700000}},
+        {"false_northing", {6600000}}}},
+      {"EPSG:3338", "albers_conical_equal_area",
+       {{"standard_parallel", {55, 65}}, {"latitude_of_projection_origin", {50}},
+        {"longitude_of_central_meridian", {-154}}}},
+      {"EPSG:3413", "polar_stereographic",
+       {{"latitude_of_projection_origin", {90}}, {"standard_parallel", {70}},
+        {"straight_vertical_longitude_from_pole", {-45}}}},
+      {"EPSG:3031", "polar_stereographic",
+       {{"latitude_of_projection_origin", {-90}}, {"standard_parallel", {-71}}}},
+      {"EPSG:3395", "mercator",
+       {{"longitude_of_projection_origin", {0}}, {"scale_factor_at_projection_origin", {1}}}},
+  };
+  for (const Case& c : cases) {
+    std::string name;
+    const auto got = cf(c.projection, &name);
+    EXPECT_EQ(name, c.name) << c.projection;
+    for (const auto& [attribute, values] : c.expected) {
+      const auto it = got.find(attribute);
+      ASSERT_NE(it, got.end()) << c.projection << " lacks " << attribute;
+      ASSERT_EQ(it->second.size(), values.size()) << c.projection << " " << attribute;
+      for (std::size_t i = 0; i < values.size(); ++i) {
+        EXPECT_NEAR(it->second[i], values[i], 1e-9) << c.projection << " " << attribute;
+      }
+    }
+  }
+  // No CF grid mapping: none invented.
+  for (const char* projection : {"LOCAL", "+proj=sinu +lon_0=10", "no such thing"}) {
+    EXPECT_TRUE(grdCfGridMapping(projection).empty()) << projection;
   }
 }
 

@@ -80,15 +80,20 @@ inline std::string cdlNumber(double value) {
   return text;
 }
 
-// A NetCDF-4 file from CDL text: what comes between "netcdf name {" and "}".
-inline void makeNc(const std::string& path, const std::string& cdl) {
+// A NetCDF file of the given kind (classic, nc4, cdf5, ...) made by ncgen from CDL text.
+inline void ncgen(const std::string& path, const std::string& cdl, const std::string& kind = "nc4") {
   const std::string source = path + ".cdl";
-  writeBytes(source, "netcdf f {\n" + cdl + "\n}\n");
+  writeBytes(source, cdl);
   int code = -1;
   const std::string out =
-      commandOutput("ncgen -k nc4 -o '" + path + "' '" + source + "' 2>&1", &code);
+      commandOutput("ncgen -k " + kind + " -o '" + path + "' '" + source + "' 2>&1", &code);
   std::remove(source.c_str());
   if (code != 0) throw std::runtime_error("ncgen failed: " + out + "\n" + cdl);
+}
+
+// A NetCDF-4 file from CDL text: what comes between "netcdf name {" and "}".
+inline void makeNc(const std::string& path, const std::string& cdl) {
+  ncgen(path, "netcdf f {\n" + cdl + "\n}\n");
 }
 
 // The values of one variable, put into a file made before.

@@ -10,38 +10,34 @@
 namespace karnet {
 namespace {
 
-TEST(BasicAxis, DataBelowTheLocalOriginExtendTheGridDownwards) {
-  // Local first node at 100, spacing 10, local nodes 0..10; data from 75 to 260.
-  const BasicAxis a = layBasicAxis(75.0, 260.0, 100.0, 10.0f, 0, 10);
-  EXPECT_DOUBLE_EQ(a.origin, 70.0);
-  EXPECT_EQ(a.offset, 3);
-  EXPECT_EQ(a.count, 21);
-  EXPECT_FALSE(a.originWarning);
-  // An observation at 75 lies half a node above the origin, one at 260 on node 19.
-  EXPECT_DOUBLE_EQ((75.0 - a.origin) / 10.0, 0.5);
-  EXPECT_DOUBLE_EQ((260.0 - a.origin) / 10.0, 19.0);
-}
-
-TEST(BasicAxis, LevelsBelowTheDeepestLocalLevel) {
-  // Levels 0..9 of 1 m: the deepest local level lies at -10; data reach -14.2 and the surface.
-  const BasicAxis z = layBasicAxis(-14.2, 0.0, -10.0, 1.0f, 0, 9);
-  EXPECT_DOUBLE_EQ(z.origin, -15.0);
-  EXPECT_EQ(z.offset, 5);
-  EXPECT_EQ(z.count, 17);
-  EXPECT_FALSE(z.originWarning);
-}
-
-TEST(BasicAxis, DataAtOrAboveTheLocalOriginKeepIt) {
-  const BasicAxis same = layBasicAxis(100.0, 150.0, 100.0, 10.0f, 0, 10);
-  EXPECT_DOUBLE_EQ(same.origin, 100.0);
-  EXPECT_EQ(same.offset, 0);
-  EXPECT_FALSE(same.originWarning);
-  const BasicAxis above = layBasicAxis(130.0, 150.0, 100.0, 10.0f, 0, 10);
-  EXPECT_DOUBLE_EQ(above.origin, 100.0);
-  EXPECT_EQ(above.offset, 0);
-  EXPECT_TRUE(above.originWarning);
-  // The local grid alone decides the size when the data end before it does.
-  EXPECT_EQ(above.count, 12);
+TEST(BasicAxis, DataBelowTheLocalOriginExtendTheGridDownwardsDataAboveKeepIt) {
+  const struct {
+    const char* what;
+    double dataMin, dataMax, localFirst;
+    float spacing;
+    std::int32_t localLast;
+    double origin;
+    std::int32_t offset;
+    std::int64_t count;
+    bool warning;
+  } cases[] = {
+      // Local nodes 0..10 from 100, spacing 10: an observation at 75 lies half a node
+      // above the origin, one at 260 on node 19.
+      {"data below the local origin", 75.0, 260.0, 100.0, 10.0f, 10, 70.0, 3, 21, false},
+      // Levels 0..9 of 1 m: the deepest local level lies at -10.
+      {"levels below the deepest local level", -14.2, 0.0, -10.0, 1.0f, 9, -15.0, 5, 17, false},
+      {"data from the local origin", 100.0, 150.0, 100.0, 10.0f, 10, 100.0, 0, 12, false},
+      // The local grid alone decides the size when the data end before it does.
+      {"data above the local origin", 130.0, 150.0, 100.0, 10.0f, 10, 100.0, 0, 12, true},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.what);
+    const BasicAxis a = layBasicAxis(c.dataMin, c.dataMax, c.localFirst, c.spacing, 0, c.localLast);
+    EXPECT_DOUBLE_EQ(a.origin, c.origin);
+    EXPECT_EQ(a.offset, c.offset);
+    EXPECT_EQ(a.count, c.count);
+    EXPECT_EQ(a.originWarning, c.warning);
+  }
 }
 
 TEST(BasicAxis, TheLocalGridAlwaysFitsWithOneNodeToSpare) {

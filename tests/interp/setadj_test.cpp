@@ -87,6 +87,13 @@ TEST(Setadj, ClosesGapsAndExtendsColumnsWithinTheirLimits) {
       // All dry: the top's height above the "bed" passes the upward test even at 0.
       {"dry column, trunc(5 - 2.5)", 8, 8, 7, 1, 0, 0, 2.5f, {{0, 0, 5, v}},
        {E, E, v, v, v, v, v, v}},
+      // Both ways in one column, each judged by its own limit: wet from level 3
+      // above a bed at -9.5, data 3.5 above it (level 6) and at level 8; the
+      // top lies 8.5 above the bed.
+      {"both ways, each within its limit", 12, 3, 11, 1, -9.5f, 9, 4,
+       {{0, 0, 6, 4}, {0, 0, 8, 12}}, {4, 4, 4, 4, 4, 4, 4, 8, 12, 12, 12, 12}},
+      {"up within its limit, down beyond its own", 12, 3, 11, 1, -9.5f, 8.6f, 3.4f,
+       {{0, 0, 6, 4}, {0, 0, 8, 12}}, {E, E, E, E, E, E, 4, 8, 12, 12, 12, 12}},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.what);

@@ -6,12 +6,10 @@
 #include <netcdf.h>
 
 #include <cstdint>
-#include <fstream>
-#include <iterator>
 #include <string>
 #include <vector>
 
-#include "common/temp_dir.h"
+#include "gridfile/nc_test_files.h"
 #include "interp/glo2loc.h"
 #include "output/result_write.h"
 #include "params/run_settings.h"
@@ -88,11 +86,6 @@ struct Result {
   ~Result() { descriptionFree(d); }
 };
 
-std::string bytes(const std::string& path) {
-  std::ifstream in(path, std::ios::binary);
-  return {std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>()};
-}
-
 TEST(LevelGather, LevelByLevelGivesTheFileOfTheWholeGrid) {
   test::TempDir dir;
   const Result result;
@@ -112,7 +105,7 @@ TEST(LevelGather, LevelByLevelGivesTheFileOfTheWholeGrid) {
   ASSERT_EQ(resultWriteLevels(dir.file("levels.nc").c_str(), *result.d, 2, levels, "LOCAL",
                               &attributes), 1);
   EXPECT_EQ(asked, (std::vector<std::int32_t>{0, 1, 2, 3, 4}));
-  EXPECT_EQ(bytes(dir.file("whole.nc")), bytes(dir.file("levels.nc")));
+  EXPECT_EQ(test::readBytes(dir.file("whole.nc")), test::readBytes(dir.file("levels.nc")));
 
   // The values as any NetCDF reader sees them: level s is z index s.
   int ncid = -1, varid = -1;
@@ -129,10 +122,7 @@ TEST(LevelGather, ALevelThatFailsLeavesNoFileAndKeepsTheEarlierOne) {
   test::TempDir dir;
   const Result result;
   const std::string path = dir.file("result.nc");
-  {
-    std::ofstream earlier(path);
-    earlier << "earlier result";
-  }
+  test::writeBytes(path, "earlier result");
   std::int32_t calls = 0;
   const ResultLevelSource failsAtThree = [&](std::int32_t s, float* buffer) {
     ++calls;
@@ -141,7 +131,7 @@ TEST(LevelGather, ALevelThatFailsLeavesNoFileAndKeepsTheEarlierOne) {
   };
   EXPECT_EQ(resultWriteLevels(path.c_str(), *result.d, 2, failsAtThree, "LOCAL"), 0);
   EXPECT_EQ(calls, 4);  // no level asked for after the failed one
-  EXPECT_EQ(bytes(path), "earlier result");
+  EXPECT_EQ(test::readBytes(path), "earlier result");
   std::vector<std::string> names;
   for (const auto& entry : std::filesystem::directory_iterator(dir.path()))
     names.push_back(entry.path().filename().string());

@@ -90,9 +90,5 @@ TEST(DateTimeParseTest, RejectsEverythingElseAndLeavesTheRecord) {
   }
 }
 
-TEST(SecondsOfDayTest, CountsWithoutNormalising) {
-  EXPECT_EQ(secondsOfDay(DateTime{0, 25, 61, 70}), (25 * 60 + 61) * 60 + 70);
-}
-
 }  // namespace
 }  // namespace karnet

@@ -1,5 +1,5 @@
 // karnet-mkgrid on GeoTIFF and NetCDF rasters: resampling, projections,
-// turned grids, land, and karnet running on what it makes.
+// turned grids, land and faults.
 #include <gtest/gtest.h>
 
 #include <cmath>
@@ -7,7 +7,6 @@
 #include <string>
 #include <vector>
 
-#include "e2e/e2e_support.h"
 #include "tools/mkgrid_test_support.h"
 
 namespace karnet {
@@ -272,32 +271,6 @@ TEST_F(MkgridRaster, TurnedGridPlacesAFeatureWhereItLies) {
   EXPECT_GT(around, 5000);
 }
 
-TEST_F(MkgridRaster, KarnetRunsOnTheMadeBathymetry) {
-  const double transform[6] = {540000, 100, 0, 6110000, 0, -100};
-  std::vector<double> values;
-  for (int r = 0; r < 100; ++r) {
-    for (int c = 0; c < 100; ++c) values.push_back(c < 10 ? 4.0 : -35.0);  // land in the west
-  }
-  test::writeGeoTiff(file("basin.tif"), 100, 100, transform, kUtm32, values);
-  make("--spacing 250", file("basin.tif"));
-  std::string casts;
-  for (int k = 0; k < 6; ++k) {
-    const std::string x = std::to_string(543000 + 1000 * k), y = std::to_string(6102000 + 1200 * k);
-    for (int z = 1; z <= 25; z += 4) {
-      casts +=
-          x + " " + y + " " + std::to_string(-z) + " " + std::to_string(10 + 0.1 * z + k) + "\n";
-    }
-  }
-  e2e::writeFile(file("observations.txt"), casts);
-  e2e::ParameterFile parameters;
-  parameters.fileName = "|test.nc|";
-  parameters.projection = "'UTM-32'";
-  e2e::writeFile(file("case.pfs"), parameters.render());
-  const e2e::ProcessResult run = e2e::runKarnet({"case.pfs"}, dir);
-  EXPECT_EQ(run.exitCode, 0) << run.err << e2e::readFile(file("case.log"));
-  EXPECT_TRUE(e2e::fileExists(file("result.nc")));
-}
-
 TEST_F(MkgridRaster, BadInputIsNamedAndLeavesNoFile) {
   const double transform[6] = {540000, 100, 0, 6102000, 0, -100};
   test::writeGeoTiff(file("small.tif"), 20, 20, transform, kUtm32, std::vector<double>(400, -5.0));
@@ -307,12 +280,8 @@ TEST_F(MkgridRaster, BadInputIsNamedAndLeavesNoFile) {
   test::putValues(nc, "elevation", std::vector<float>(9, 0.0f));
   // A classic NetCDF file cut short after its header: its values would read as zeros.
   const std::string classic = file("cut.nc");
-  test::writeBytes(classic + ".cdl", "netcdf c {\n" + lonLatCdl(3, 54.0, 3, 8.0) +
-                                         " elevation = 1, 2, 3, 4, 5, 6, 7, 8, 9 ;\n}\n");
-  int made = -1;
-  test::commandOutput("ncgen -k classic -o " + quoted(classic) + " " + quoted(classic + ".cdl"),
-                      &made);
-  ASSERT_EQ(made, 0);
+  test::ncgen(classic, "netcdf c {\n" + lonLatCdl(3, 54.0, 3, 8.0) +
+                           " elevation = 1, 2, 3, 4, 5, 6, 7, 8, 9 ;\n}\n", "classic");
   std::filesystem::resize_file(classic, std::filesystem::file_size(classic) - 20);
   const std::string tif = quoted(file("small.tif")) + " ";
   const std::pair<std::string, const char*> cases[] = {

@@ -1,11 +1,9 @@
 #ifndef KARNET_TESTS_TOOLS_OBS_ARGO_CDL_H_
 #define KARNET_TESTS_TOOLS_OBS_ARGO_CDL_H_
 
-#include <cstdlib>
-#include <stdexcept>
 #include <string>
 
-#include "common/temp_dir.h"
+#include "gridfile/nc_test_files.h"
 
 namespace karnet::test {
 
@@ -61,13 +59,10 @@ data:
 }
 )";
 
-// Writes cdl through ncgen as dir/name and gives the path.
+// Writes cdl through ncgen as the classic file dir/name and gives the path.
 inline std::string ncgenFile(const TempDir& dir, const std::string& name, const std::string& cdl) {
-  const std::string source = dir.write(name + ".cdl", cdl);
-  const std::string path = dir.file(name);
-  const std::string command = "ncgen -o '" + path + "' '" + source + "'";
-  if (std::system(command.c_str()) != 0) throw std::runtime_error("ncgen failed: " + command);
-  return path;
+  ncgen(dir.file(name), cdl, "classic");
+  return dir.file(name);
 }
 
 }  // namespace karnet::test

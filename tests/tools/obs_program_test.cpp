@@ -1,5 +1,4 @@
-// karnet-obs as users run it: projection, pressure, filters, counts, faults, and karnet on its
-// output.
+// karnet-obs as users run it: projection, pressure, filters, counts and faults.
 #include <gtest/gtest.h>
 #include <proj.h>
 
@@ -173,7 +172,6 @@ TEST(ObsProgram, BadInputStopsWithoutOutputAndHelpNeedsNone) {
       {{"-p", "UTM-32", "allbad.csv"}, "no observation left to write"},
       {{"-p", "UTM-32", "missing.csv"}, "karnet-obs: missing.csv: cannot open"},
       {{"-p", "UTM-32", "."}, "karnet-obs: .: is a directory"},
-      {{"-p", "UTM-32", "--variable", "DOXY", "argo_prof.nc"}, "argo_prof.nc: no variable DOXY"},
       {{"-p", "LOCAL", "argo_prof.nc"}, "pressure needs a latitude"},
       {{"-p", "UTM-99", "good.csv"}, "projection 'UTM-99' not usable"},
       {{"-b", "good.csv", "good.csv"}, "good.csv: cannot read the bathymetry file"},
@@ -214,59 +212,6 @@ TEST(ObsProgram, BadInputStopsWithoutOutputAndHelpNeedsNone) {
   const ProcessResult version = runObs({"--version"}, dir);
   EXPECT_EQ(version.exitCode, 0);
   EXPECT_EQ(version.out.rfind("karnet-obs ", 0), 0u);
-}
-
-// Casts given as longitude, latitude and depth, made into karnet's observation file and
-// gridded by karnet over a UTM bathymetry: every estimate is the casts' common profile.
-TEST(ObsProgram, KarnetRunsOnTheOutput) {
-  const TempDir dir;
-  BathymetrySpec b;
-  b.nx = 21;
-  b.ny = 21;
-  b.spacing = 250.0;
-  b.projection = "UTM-32";
-  b.originLongitude = 11.3;
-  b.originLatitude = 55.2;
-  b.heights.assign(21 * 21, -25.0f);
-  writeBathymetry(dir.file("bathymetry.nc"), b);
-  std::ostringstream casts;
-  casts << "Longitude,Latitude,Depth,Temp\n";
-  for (int j = 0; j < 5; ++j) {
-    for (int i = 0; i < 5; ++i) {
-      for (int depth = 2; depth <= 20; depth += 2) {
-        casts << 11.3 + 0.018 * i << ',' << 55.2 + 0.011 * j << ',' << depth << ','
-              << 5.0 + 0.25 * depth << '\n';
-      }
-    }
-  }
-  writeFile(dir.file("casts.csv"), casts.str());
-  const ProcessResult obs =
-      runObs({"--bathymetry", "bathymetry.nc", "casts.csv", "-o", "observations.txt"}, dir);
-  ASSERT_EQ(obs.exitCode, 0) << obs.err;
-
-  ParameterFile p;
-  p.projection = "'UTM-32'";
-  p.zRange = "0, 9";
-  p.spacing = "2";
-  p.searchRadius = "3000";
-  p.filterOperations = "0";
-  writeFile(dir.file("case.pfs"), p.render());
-  const ProcessResult run = runKarnet({"case.pfs"}, dir.path(), {{"buildmode", "nigth"}});
-  ASSERT_EQ(run.exitCode, 0) << run.err << readFile(dir.file("case.log"));
-  int shape[3] = {0, 0, 0};
-  const std::vector<float> values = readResult(dir.file("result.nc"), nullptr, shape);
-  ASSERT_EQ(shape[0], 10);
-  int estimates = 0;
-  for (int k = 0; k < shape[0]; ++k) {
-    const double depth = 20.0 - 2.0 * k;  // level 0 is the deepest
-    for (int n = 0; n < shape[1] * shape[2]; ++n) {
-      const float v = values[static_cast<std::size_t>(k) * shape[1] * shape[2] + n];
-      if (v == -1e-30f) continue;
-      ++estimates;
-      EXPECT_NEAR(v, 5.0 + 0.25 * depth, 1e-3) << "level " << k;
-    }
-  }
-  EXPECT_GT(estimates, shape[0] * shape[1] * shape[2] / 2);
 }
 
 // The Argo multi-profile file of the Angola Basin example, as downloaded (a classic-format
