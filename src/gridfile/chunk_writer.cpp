@@ -208,7 +208,7 @@ herr_t imageDataFree(void*) { return 0; }
 // Stores the chunks of `slabs` consecutive 2-D slabs of a dataset (each ny
 // rows of nx elements of elementSize bytes, x fastest, one after the other in
 // data) in chunks of cy x cx: each chunk shuffled and deflated on its own, on
-// up to `threads` threads, so the bytes do not depend on their number, then
+// up to `threads` threads, so the bytes do not depend on their number, and
 // stored in order. Slab s's chunks go to the offset whose leading entries
 // leading(s, offset) sets (it returns how many) and whose last two are the row
 // (from firstRow) and the column. Edge chunks are stored whole, the part
@@ -224,52 +224,56 @@ bool storeChunks(hid_t dataset, std::size_t elementSize, std::int64_t slabs, std
   const std::int64_t perSlab = across * down;
   const std::int64_t tasks = perSlab * slabs;
   const auto size = static_cast<std::int64_t>(elementSize);
-  std::vector<std::vector<unsigned char>> compressed(static_cast<std::size_t>(tasks));
   std::atomic<bool> failed{false};
-#pragma omp parallel for schedule(dynamic, 1) num_threads(threads) if (threads > 1 && tasks > 1)
+  // Each chunk is stored as soon as it and every chunk before it are ready
+  // (in order, one thread at a time), while the other threads go on
+  // compressing the next ones.
+#pragma omp parallel for ordered schedule(dynamic, 1) num_threads(threads) \
+    if (threads > 1 && tasks > 1)
   for (std::int64_t t = 0; t < tasks; ++t) {
-    if (failed.load(std::memory_order_relaxed)) continue;
-    try {
-      const std::int64_t slab = t / perSlab;
-      const std::int64_t row0 = (t % perSlab) / across * cy;
-      const std::int64_t col0 = (t % perSlab) % across * cx;
-      const std::int64_t rows = std::min(cy, ny - row0);
-      const std::int64_t cols = std::min(cx, nx - col0);
-      const unsigned char* slabData = data + slab * nx * ny * size;
-      std::vector<unsigned char> chunk;
-      const unsigned char* values = slabData + (row0 * nx + col0) * size;
-      if (rows != cy || cols != cx || cx != nx) {
-        chunk.resize(static_cast<std::size_t>(cx * cy * size));
-        for (std::int64_t e = 0; e < cx * cy; ++e) {
-          std::memcpy(chunk.data() + e * size, fill, elementSize);
+    std::vector<unsigned char> compressed;
+    bool made = false;
+    if (!failed.load(std::memory_order_relaxed)) {
+      try {
+        const std::int64_t slab = t / perSlab;
+        const std::int64_t row0 = (t % perSlab) / across * cy;
+        const std::int64_t col0 = (t % perSlab) % across * cx;
+        const std::int64_t rows = std::min(cy, ny - row0);
+        const std::int64_t cols = std::min(cx, nx - col0);
+        const unsigned char* slabData = data + slab * nx * ny * size;
+        std::vector<unsigned char> chunk;
+        const unsigned char* values = slabData + (row0 * nx + col0) * size;
+        if (rows != cy || cols != cx || cx != nx) {
+          chunk.resize(static_cast<std::size_t>(cx * cy * size));
+          for (std::int64_t e = 0; e < cx * cy; ++e) {
+            std::memcpy(chunk.data() + e * size, fill, elementSize);
+          }
+          for (std::int64_t r = 0; r < rows; ++r) {
+            std::memcpy(chunk.data() + r * cx * size, slabData + ((row0 + r) * nx + col0) * size,
+                        static_cast<std::size_t>(cols * size));
+          }
+          values = chunk.data();
         }
-        for (std::int64_t r = 0; r < rows; ++r) {
-          std::memcpy(chunk.data() + r * cx * size, slabData + ((row0 + r) * nx + col0) * size,
-                      static_cast<std::size_t>(cols * size));
-        }
-        values = chunk.data();
+        made = compressShuffledChunk(values, static_cast<std::size_t>(cx * cy), elementSize,
+                                     compressed);
+      } catch (const std::bad_alloc&) {
+        made = false;
       }
-      if (!compressShuffledChunk(values, static_cast<std::size_t>(cx * cy), elementSize,
-                                 compressed[static_cast<std::size_t>(t)])) {
+      if (!made) failed = true;
+    }
+#pragma omp ordered
+    if (made && !failed.load()) {
+      hsize_t offset[kMaxRank] = {};
+      const int d = leading(t / perSlab, offset);
+      offset[d] = static_cast<hsize_t>(firstRow + (t % perSlab) / across * cy);
+      offset[d + 1] = static_cast<hsize_t>((t % perSlab) % across * cx);
+      if (H5Dwrite_chunk(dataset, H5P_DEFAULT, 0, offset, compressed.size(), compressed.data()) <
+          0) {
         failed = true;
       }
-    } catch (const std::bad_alloc&) {
-      failed = true;
     }
   }
-  if (failed) return false;
-  for (std::int64_t t = 0; t < tasks; ++t) {
-    hsize_t offset[kMaxRank] = {};
-    const int d = leading(t / perSlab, offset);
-    offset[d] = static_cast<hsize_t>(firstRow + (t % perSlab) / across * cy);
-    offset[d + 1] = static_cast<hsize_t>((t % perSlab) % across * cx);
-    std::vector<unsigned char>& bytes = compressed[static_cast<std::size_t>(t)];
-    if (H5Dwrite_chunk(dataset, H5P_DEFAULT, 0, offset, bytes.size(), bytes.data()) < 0) {
-      return false;
-    }
-    std::vector<unsigned char>().swap(bytes);
-  }
-  return true;
+  return !failed.load();
 }
 
 // Whether the dataset is stored in chunks through the filters shuffle then

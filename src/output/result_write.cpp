@@ -87,24 +87,36 @@ int describeErrorItem(GrdHeader* header, const FileDescription& d, std::int32_t 
 
 namespace {
 
-// Writes the file; with level sources, item 1's levels in increasing order,
-// then (when given) the error field's as item 2.
+// Where the levels of an item come from: a source that hands them over one
+// by one, or all of them as they lie one after the other in memory.
+struct ItemLevels {
+  const ResultLevelSource* source = nullptr;
+  const float* whole = nullptr;
+  bool present() const { return source != nullptr || whole != nullptr; }
+};
+
+// Writes the file; with levels, item 1's levels in increasing order, then
+// (when given) the error field's as item 2. Levels held whole go to the file
+// in one pass whose chunks are compressed on all threads; levels from a
+// source go in batches of one per thread. Both store the same chunks in the
+// same order, so the bytes are the same.
 int writeResult(const char* fileName, const FileDescription& description,
-                std::int32_t itemType, const ResultLevelSource* levels,
-                const ResultLevelSource* errorLevels, const char* projection,
-                const TextAttributes* globalAttributes, std::string* reason, int threads) {
+                std::int32_t itemType, ItemLevels levels, ItemLevels errorLevels,
+                const char* projection, const TextAttributes* globalAttributes,
+                std::string* reason, int threads) {
   std::string ignored;
   if (reason == nullptr) reason = &ignored;
   grdInitSystem();
   GrdHeader* header = nullptr;
-  if (grdHeaderCreate(errorLevels != nullptr ? 2 : 1, fileName, "", 1, 1, 2, &header) != 0) {
+  const bool withErrors = errorLevels.present();
+  if (grdHeaderCreate(withErrors ? 2 : 1, fileName, "", 1, 1, 2, &header) != 0) {
     grdHeaderDestroy(&header);
     *reason = "cannot be described";
     return 0;
   }
   GrdFile* file = nullptr;
   if (describeResult(header, description, itemType, projection, globalAttributes) != 0 ||
-      (errorLevels != nullptr && describeErrorItem(header, description, itemType) != 0)) {
+      (withErrors && describeErrorItem(header, description, itemType) != 0)) {
     grdHeaderDestroy(&header);
     *reason = "its layout cannot be described (axes, projection or attributes)";
     return 0;
@@ -116,23 +128,27 @@ int writeResult(const char* fileName, const FileDescription& description,
     if (reason->empty()) *reason = "cannot be created";
     return 0;
   }
-  if (levels != nullptr) {
+  if (levels.present()) {
     const std::int64_t nx = description.axes[1].lastIndex + 1;
     const std::int64_t ny = description.axes[2].lastIndex + 1;
     const std::int32_t nz = description.axes[3].lastIndex + 1;
-    // Levels go to the file in batches of one per thread, whose chunks are
-    // compressed at once.
     const std::int32_t batch = std::clamp<std::int32_t>(threads, 1, std::max(nz, 1));
-    std::vector<float> buffer(static_cast<std::size_t>(nx * ny * batch));
+    std::vector<float> buffer;
     bool written = true;
-    for (int item = 1; item <= (errorLevels != nullptr ? 2 : 1) && written; ++item) {
-      const ResultLevelSource& source = item == 1 ? *levels : *errorLevels;
-      for (std::int32_t s = 0; s < nz && written; s += batch) {
-        const std::int32_t count = std::min(batch, nz - s);
-        for (std::int32_t b = 0; b < count && written; ++b) {
-          written = source(s + b, buffer.data() + b * nx * ny);
+    for (int item = 1; item <= (withErrors ? 2 : 1) && written; ++item) {
+      const ItemLevels& from = item == 1 ? levels : errorLevels;
+      if (from.whole != nullptr) {
+        written = nz < 1 || grdWriteItemLevels(header, file, 0, nz, from.whole, item) == 0;
+      } else {
+        buffer.resize(static_cast<std::size_t>(nx * ny * batch));
+        for (std::int32_t s = 0; s < nz && written; s += batch) {
+          const std::int32_t count = std::min(batch, nz - s);
+          for (std::int32_t b = 0; b < count && written; ++b) {
+            written = (*from.source)(s + b, buffer.data() + b * nx * ny);
+          }
+          written =
+              written && grdWriteItemLevels(header, file, s, count, buffer.data(), item) == 0;
         }
-        written = written && grdWriteItemLevels(header, file, s, count, buffer.data(), item) == 0;
       }
       written = written && grdFinishItemTimeStep(header, file, 0.0, item) == 0;
     }
@@ -148,14 +164,21 @@ int writeResult(const char* fileName, const FileDescription& description,
   return closed == 0 ? 1 : 0;
 }
 
-// The levels of a whole local grid, for the writer.
-ResultLevelSource levelsOf(const FloatGrid3D& values, std::int64_t described) {
+// The levels of a whole local grid, for the writer: as they lie when the grid
+// holds every level of the file's layer size, else through a source that
+// refuses the levels it lacks.
+ItemLevels levelsOf(const FloatGrid3D& values, std::int64_t described, std::int32_t levels,
+                    ResultLevelSource& source) {
+  if (values.data != nullptr && values.layerSize() == described && values.nl >= levels) {
+    return ItemLevels{nullptr, values.data};
+  }
   const std::int64_t layer = values.layerSize();
-  return [&values, layer, described](std::int32_t s, float* buffer) {
+  source = [&values, layer, described](std::int32_t s, float* buffer) {
     if (values.data == nullptr || layer != described || s < 0 || s >= values.nl) return false;
     std::copy(values.data + s * layer, values.data + (s + 1) * layer, buffer);
     return true;
   };
+  return ItemLevels{&source, nullptr};
 }
 
 }  // namespace
@@ -166,19 +189,14 @@ int resultWrite(const char* fileName, const FileDescription& description, int wr
                 std::string* reason, int threads) {
   const std::int64_t described = std::int64_t{description.axes[1].lastIndex + 1} *
                                  (description.axes[2].lastIndex + 1);
-  // The values go level by level, as in a run over several processes, so that
-  // both give the same bytes.
-  const ResultLevelSource fromGrid = levelsOf(values, described);
-  const ResultLevelSource fromErrors =
-      errorValues != nullptr ? levelsOf(*errorValues, described) : ResultLevelSource{};
-  if (writeValues == 0) {
-    // Without values the error item is still described.
-    return writeResult(fileName, description, itemType, nullptr,
-                       errorValues != nullptr ? &fromErrors : nullptr, projection,
-                       globalAttributes, reason, threads);
-  }
-  return writeResult(fileName, description, itemType, &fromGrid,
-                     errorValues != nullptr ? &fromErrors : nullptr, projection,
+  const std::int32_t nz = description.axes[3].lastIndex + 1;
+  ResultLevelSource gridSource, errorSource;
+  const ItemLevels fromErrors =
+      errorValues != nullptr ? levelsOf(*errorValues, described, nz, errorSource) : ItemLevels{};
+  // Without values the error item is still described.
+  const ItemLevels fromGrid =
+      writeValues != 0 ? levelsOf(values, described, nz, gridSource) : ItemLevels{};
+  return writeResult(fileName, description, itemType, fromGrid, fromErrors, projection,
                      globalAttributes, reason, threads);
 }
 
@@ -187,8 +205,9 @@ int resultWriteLevels(const char* fileName, const FileDescription& description,
                       const char* projection, const TextAttributes* globalAttributes,
                       const ResultLevelSource* errorLevels, std::string* reason,
                       int threads) {
-  return writeResult(fileName, description, itemType, &levels, errorLevels, projection,
-                     globalAttributes, reason, threads);
+  return writeResult(fileName, description, itemType, ItemLevels{&levels, nullptr},
+                     ItemLevels{errorLevels, nullptr}, projection, globalAttributes, reason,
+                     threads);
 }
 
 }  // namespace karnet
