@@ -127,8 +127,8 @@ void removeWeightedMean(const OaWorkspace& ws, const float* a, float* values, st
 namespace {
 
 // Room for the inverses of one line: at most this many bytes of cells and
-// values per line kept.
-constexpr std::size_t kCacheBytes = std::size_t{16} << 20;
+// values (a line of L-like nodes keeps about 1 MiB).
+constexpr std::size_t kCacheBytes = std::size_t{4} << 20;
 
 std::uint64_t cellsHash(const std::int32_t* cells, std::int32_t m) {
   std::uint64_t h = 0x9e3779b97f4a7c15ull ^ static_cast<std::uint64_t>(m);
@@ -172,15 +172,17 @@ InverseCache::InverseCache(std::int32_t limit, std::int64_t lineNodes, bool keep
   }
 }
 
+void InverseCache::clear(Generation& g) {
+  if (g.entries.empty()) return;
+  g.entries.clear();
+  g.cellsUsed = 0;
+  g.valuesUsed = 0;
+  std::fill(g.slots.begin(), g.slots.end(), 0u);
+}
+
 void InverseCache::startLine() {
   current_ ^= 1;
-  Generation& g = generations_[current_];
-  if (!g.entries.empty()) {
-    g.entries.clear();
-    g.cellsUsed = 0;
-    g.valuesUsed = 0;
-    std::fill(g.slots.begin(), g.slots.end(), 0u);
-  }
+  clear(generations_[current_]);
   last_ = nullptr;
 }
 
@@ -250,7 +252,15 @@ KeptInverse* InverseCache::find(const std::int32_t* cells, std::int32_t m) {
 
 KeptInverse* InverseCache::keep(const std::int32_t* cells, std::int32_t m, std::int32_t result,
                                 const char* reason) {
-  KeptInverse* e = add(generations_[current_], cells, m, cellsHash(cells, m));
+  Generation& g = generations_[current_];
+  const std::uint64_t hash = cellsHash(cells, m);
+  KeptInverse* e = add(g, cells, m, hash);
+  if (e == nullptr) {
+    // The line's room is used up: its inverses so far make way, so that the
+    // next nodes can still take this one (those of the line before stay).
+    clear(g);
+    e = add(g, cells, m, hash);
+  }
   last_ = e;
   if (e == nullptr) return nullptr;
   e->result = result;

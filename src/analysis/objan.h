@@ -30,8 +30,9 @@ struct KeptInverse {
 // The inverses one thread made on the line of nodes it is walking and on the
 // line before: neighbouring nodes of the two lines mostly choose the same
 // cells. Entries of older lines are dropped as a new line starts; an entry
-// that the new line uses again is carried over. Room is reserved for a line's
-// nodes; what does not fit is simply not kept.
+// that the new line uses again is carried over. A line has room for a few
+// MiB of inverses; when that is used up, the line's entries so far are
+// dropped.
 class InverseCache {
  public:
   // limit: the most cells of an estimate; lineNodes: the nodes of a line;
@@ -65,6 +66,7 @@ class InverseCache {
     std::size_t valuesUsed = 0;
     std::vector<std::uint32_t> slots;  // entry index + 1, 0 when free
   };
+  static void clear(Generation& g);
   KeptInverse* add(Generation& g, const std::int32_t* cells, std::int32_t m,
                    std::uint64_t hash);
   KeptInverse* lookUp(Generation& g, const std::int32_t* cells, std::int32_t m,
