@@ -239,9 +239,11 @@ KeptInverse* InverseCache::find(const std::int32_t* cells, std::int32_t m) {
       carried->mean = earlier->mean;
       carried->hasEntrySum = earlier->hasEntrySum;
       carried->entrySum = earlier->entrySum;
-      const std::size_t floats =
-          static_cast<std::size_t>(m) * (keepMatrices_ ? static_cast<std::size_t>(m) + 1 : 1);
-      std::copy(earlier->products, earlier->products + floats, carried->products);
+      if (earlier->result == 0) {  // a failed inversion left no values
+        const std::size_t floats =
+            static_cast<std::size_t>(m) * (keepMatrices_ ? static_cast<std::size_t>(m) + 1 : 1);
+        std::copy(earlier->products, earlier->products + floats, carried->products);
+      }
       found = carried;
     }
   }
