@@ -14,7 +14,8 @@ inline void rowBlock(const float* a, std::int64_t stride, const float* values, s
   Sum product[R] = {};
   Sum sum[R] = {};
   for (std::int32_t j = 0; j < columns; ++j) {
-    const auto v = static_cast<Sum>(values[j]);
+    // values is not read (and may be null) without products.
+    const Sum v = WithProducts ? static_cast<Sum>(values[j]) : Sum{};
     for (int r = 0; r < R; ++r) {
       const auto x = static_cast<Sum>(a[(i + r) * stride + j]);
       if constexpr (WithProducts) product[r] = product[r] + x * v;
