@@ -12,33 +12,30 @@ namespace {
 
 constexpr std::int32_t kRows = 8;  // rows summed side by side
 
-}  // namespace
-
-double inverseEntrySum(const float* inverse, std::int64_t stride, std::int32_t m) {
+// The inverse's rows eight at a time: sums(i0, rows, products, sums) forms
+// the products with the node's correlations and/or the entry sums of rows
+// i0 .. i0 + rows - 1, in either layout.
+template <typename RowSums>
+double entrySumOf(std::int32_t m, RowSums sums) {
   double total = 0.0;
   for (std::int32_t i0 = 0; i0 < m; i0 += kRows) {
     const std::int32_t rows = std::min(kRows, m - i0);
     double rowSum[kRows];
-    doubleRowSums(inverse + i0 * stride, stride, nullptr, rows, m, nullptr, rowSum);
+    sums(i0, rows, nullptr, rowSum);
     for (std::int32_t k = 0; k < rows; ++k) total += rowSum[k];
   }
   return total;
 }
 
-float estimateErrorVariance(const OaWorkspace& ws, std::int32_t m) {
-  return estimateErrorVariance(ws, m, ws.matrix, ws.limit,
-                               inverseEntrySum(ws.matrix, ws.limit, m));
-}
-
-float estimateErrorVariance(const OaWorkspace& ws, std::int32_t m, const float* inverse,
-                            std::int64_t stride, double entrySum) {
-  double rInvR = 0.0;   // r' A^-1 r
+template <typename RowSums>
+float errorVarianceOf(const OaWorkspace& ws, std::int32_t m, double entrySum, RowSums sums) {
+  double rInvR = 0.0;    // r' A^-1 r
   double oneInvR = 0.0;  // 1' A^-1 r
   // Per row i: (A^-1 r)_i, eight rows at a time.
   for (std::int32_t i0 = 0; i0 < m; i0 += kRows) {
     const std::int32_t rows = std::min(kRows, m - i0);
     double invR[kRows];
-    doubleRowSums(inverse + i0 * stride, stride, ws.selCorr, rows, m, invR, nullptr);
+    sums(i0, rows, invR, nullptr);
     for (std::int32_t k = 0; k < rows; ++k) {
       rInvR += static_cast<double>(ws.selCorr[i0 + k]) * invR[k];
       oneInvR += invR[k];
@@ -53,17 +50,40 @@ float estimateErrorVariance(const OaWorkspace& ws, std::int32_t m, const float* 
   return static_cast<float>(e);
 }
 
+}  // namespace
+
+double inverseEntrySum(const float* inverse, std::int64_t stride, std::int32_t m) {
+  return entrySumOf(m, [=](std::int32_t i0, std::int32_t rows, double* products, double* sums) {
+    doubleRowSums(inverse + i0 * stride, stride, nullptr, rows, m, products, sums);
+  });
+}
+
+float estimateErrorVariance(const OaWorkspace& ws, std::int32_t m) {
+  return estimateErrorVariance(ws, m, ws.matrix, ws.limit,
+                               inverseEntrySum(ws.matrix, ws.limit, m));
+}
+
+float estimateErrorVariance(const OaWorkspace& ws, std::int32_t m, const float* inverse,
+                            std::int64_t stride, double entrySum) {
+  return errorVarianceOf(
+      ws, m, entrySum, [&](std::int32_t i0, std::int32_t rows, double* products, double* sums) {
+        doubleRowSums(inverse + i0 * stride, stride, ws.selCorr, rows, m, products, sums);
+      });
+}
+
 float estimateErrorVariance(const OaWorkspace& ws, const InverseCache& cache, std::int32_t m) {
   KeptInverse* entry = cache.usedEntry;
-  if (entry == nullptr) {
-    return estimateErrorVariance(ws, m, cache.used, cache.usedStride,
-                                 inverseEntrySum(cache.used, cache.usedStride, m));
-  }
+  if (entry == nullptr || entry->inverse == nullptr) return estimateErrorVariance(ws, m);
+  // A kept inverse is stored column by column.
+  const float* byColumn = entry->inverse;
+  auto sums = [&](std::int32_t i0, std::int32_t rows, double* products, double* rowSums) {
+    doubleColumnSums(byColumn + i0, m, ws.selCorr, rows, m, products, rowSums);
+  };
   if (!entry->hasEntrySum) {
-    entry->entrySum = inverseEntrySum(cache.used, cache.usedStride, m);
+    entry->entrySum = entrySumOf(m, sums);
     entry->hasEntrySum = true;
   }
-  return estimateErrorVariance(ws, m, cache.used, cache.usedStride, entry->entrySum);
+  return errorVarianceOf(ws, m, entry->entrySum, sums);
 }
 
 }  // namespace karnet

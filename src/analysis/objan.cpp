@@ -286,16 +286,12 @@ std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSe
     mean = hit->mean;
     for (std::int32_t i = 0; i < m; ++i) ws.selValue[i] = ws.selValue[i] - mean;
     products = hit->products;
-    cache->used = hit->inverse;
-    cache->usedStride = m;
     cache->usedEntry = hit;
   } else {
     const std::int32_t inverted = buildCorrelationMatrix(ws, m, settings);
     KeptInverse* kept = nullptr;
     if (cache != nullptr) {
       kept = cache->keep(ws.selIndex, m, inverted, ws.errorText);
-      cache->used = ws.matrix;
-      cache->usedStride = stride;
       cache->usedEntry = kept;
     }
     if (inverted != 0) return -1;
@@ -306,9 +302,12 @@ std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSe
       kept->mean = mean;
       std::copy(ws.rowProducts, ws.rowProducts + m, kept->products);
       if (kept->inverse != nullptr) {
+        // By column, so that the error variance loads the rows of a column
+        // side by side.
         for (std::int32_t i = 0; i < m; ++i) {
-          std::copy(ws.matrix + i * stride, ws.matrix + i * stride + m,
-                    kept->inverse + i * std::int64_t{m});
+          for (std::int32_t j = 0; j < m; ++j) {
+            kept->inverse[j * std::int64_t{m} + i] = ws.matrix[i * stride + j];
+          }
         }
       }
     }

@@ -22,7 +22,7 @@ struct KeptInverse {
   float mean = 0.0f;               // weighted mean of the values (success only)
   std::int32_t* cells = nullptr;   // count indices
   float* products = nullptr;       // count row products with the values less the mean
-  float* inverse = nullptr;        // count x count, rows of count; null unless kept
+  float* inverse = nullptr;        // count x count by column ((i, j) at j * count + i)
   bool hasEntrySum = false;        // entrySum made (by the first error variance)
   double entrySum = 0.0;           // the inverse's entry sum (inverseEntrySum)
 };
@@ -50,11 +50,9 @@ class InverseCache {
   KeptInverse* keep(const std::int32_t* cells, std::int32_t m, std::int32_t result,
                     const char* reason);
   bool keepsMatrices() const { return keepMatrices_; }
-  // Where the inverse of the last successful estimate is (when matrices are
-  // kept): the workspace's matrix or a kept one, rows usedStride apart.
-  const float* used = nullptr;
-  std::int64_t usedStride = 0;
-  KeptInverse* usedEntry = nullptr;  // its entry, null when it was not kept
+  // The kept inverse of the last estimate; null when it was not kept (its
+  // inverse is then in the workspace's matrix).
+  KeptInverse* usedEntry = nullptr;
   std::int64_t reused = 0;  // estimates that took a kept inverse
 
  private:
@@ -90,8 +88,8 @@ class InverseCache {
 // naming the reason. ws.selValue is left with the mean removed.
 // With a cache, the matrix is not built and inverted again when the chosen
 // cells (ws.selIndex[0..m-1]) are those of a kept inverse: the mean and row
-// products are the kept ones, and the estimate is the same bit for bit. When
-// the cache keeps matrices, cache->used points to the inverse used.
+// products are the kept ones, and the estimate is the same bit for bit.
+// cache->usedEntry tells which kept inverse the estimate used.
 std::int32_t OBJAN(OaWorkspace& ws, std::int32_t m, float* estimate, const RunSettings& settings,
                    InverseCache* cache = nullptr);
 

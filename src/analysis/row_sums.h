@@ -20,6 +20,14 @@ void floatRowSums(const float* a, std::int64_t stride, const float* values, std:
 void doubleRowSums(const float* a, std::int64_t stride, const float* values, std::int32_t rows,
                    std::int32_t columns, double* products, double* sums);
 
+// The same double sums from a matrix stored column by column: entry (i, j) at
+// aT[j * stride + i]. Each row's sums are formed in the same order, so they
+// have the same bits; here the rows of a column are loaded side by side. With
+// vectorised, the processor's vector body where it has one.
+void doubleColumnSums(const float* aT, std::int64_t stride, const float* values,
+                      std::int32_t rows, std::int32_t columns, double* products, double* sums,
+                      bool vectorised = true);
+
 }  // namespace karnet
 
 #endif  // KARNET_ANALYSIS_ROW_SUMS_H_

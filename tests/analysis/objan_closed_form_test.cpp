@@ -159,6 +159,33 @@ TEST(ObjanClosedForm, RowSumsAreEachRowsSumInColumnOrder) {
     floatRowSums(a.data(), stride, values.data(), rows, columns, nullptr, alone.data());
     EXPECT_EQ(std::memcmp(alone.data(), products.data(), alone.size() * 4), 0) << trial;
     doubleRowSums(a.data(), stride, values.data(), rows, columns, dproducts.data(), dsums.data());
+    // The same matrix stored by column (with a longer column stride), through the
+    // vector body and the plain one, products and sums together and alone.
+    const std::int64_t columnStride = rows + trial % 3;
+    std::vector<float> aT(static_cast<std::size_t>(columns * columnStride), -1.0f);
+    for (std::int32_t i = 0; i < rows; ++i) {
+      for (std::int32_t j = 0; j < columns; ++j) {
+        aT[static_cast<std::size_t>(j * columnStride + i)] = a[static_cast<std::size_t>(i * stride + j)];
+      }
+    }
+    for (const bool vectorised : {true, false}) {
+      std::vector<double> cproducts(sums.size()), csums(sums.size());
+      std::vector<double> cproductsAlone(sums.size()), csumsAlone(sums.size());
+      doubleColumnSums(aT.data(), columnStride, values.data(), rows, columns, cproducts.data(),
+                       csums.data(), vectorised);
+      doubleColumnSums(aT.data(), columnStride, values.data(), rows, columns,
+                       cproductsAlone.data(), nullptr, vectorised);
+      doubleColumnSums(aT.data(), columnStride, nullptr, rows, columns, nullptr,
+                       csumsAlone.data(), vectorised);
+      for (const auto* got : {&cproducts, &cproductsAlone}) {
+        EXPECT_EQ(std::memcmp(got->data(), dproducts.data(), dproducts.size() * 8), 0)
+            << trial << (vectorised ? " vector" : " plain");
+      }
+      for (const auto* got : {&csums, &csumsAlone}) {
+        EXPECT_EQ(std::memcmp(got->data(), dsums.data(), dsums.size() * 8), 0)
+            << trial << (vectorised ? " vector" : " plain");
+      }
+    }
     for (std::int32_t i = 0; i < rows; ++i) {
       float sum = 0.0f, product = 0.0f;
       double dsum = 0.0, dproduct = 0.0;
