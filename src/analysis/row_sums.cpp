@@ -9,10 +9,17 @@
 namespace karnet {
 namespace {
 
+// Where entry (i, j) lies: in rows of `stride` entries, or (ByColumn) in
+// columns of `stride` entries.
+template <bool ByColumn>
+inline std::int64_t entryAt(std::int64_t stride, std::int64_t i, std::int64_t j) {
+  return ByColumn ? j * stride + i : i * stride + j;
+}
+
 // Rows i .. i + R - 1: each row's sums over its columns in turn, the rows of
 // the block worked on side by side so that their chains of additions overlap
 // instead of waiting on one another.
-template <int R, bool WithProducts, bool WithSums, typename Sum>
+template <int R, bool ByColumn, bool WithProducts, bool WithSums, typename Sum>
 inline void rowBlock(const float* a, std::int64_t stride, const float* values, std::int32_t i,
                      std::int32_t columns, Sum* products, Sum* sums) {
   Sum product[R] = {};
@@ -21,7 +28,7 @@ inline void rowBlock(const float* a, std::int64_t stride, const float* values, s
     // values is not read (and may be null) without products.
     const Sum v = WithProducts ? static_cast<Sum>(values[j]) : Sum{};
     for (int r = 0; r < R; ++r) {
-      const auto x = static_cast<Sum>(a[(i + r) * stride + j]);
+      const auto x = static_cast<Sum>(a[entryAt<ByColumn>(stride, i + r, j)]);
       if constexpr (WithProducts) product[r] = product[r] + x * v;
       if constexpr (WithSums) sum[r] = sum[r] + x;
     }
@@ -34,47 +41,16 @@ inline void rowBlock(const float* a, std::int64_t stride, const float* values, s
 
 constexpr int kBlock = 4;
 
-template <bool WithProducts, bool WithSums, typename Sum>
+template <bool ByColumn, bool WithProducts, bool WithSums, typename Sum>
 void rowSums(const float* a, std::int64_t stride, const float* values, std::int32_t rows,
              std::int32_t columns, Sum* products, Sum* sums) {
   std::int32_t i = 0;
   for (; i + kBlock <= rows; i += kBlock) {
-    rowBlock<kBlock, WithProducts, WithSums>(a, stride, values, i, columns, products, sums);
+    rowBlock<kBlock, ByColumn, WithProducts, WithSums>(a, stride, values, i, columns, products,
+                                                       sums);
   }
   for (; i < rows; ++i) {
-    rowBlock<1, WithProducts, WithSums>(a, stride, values, i, columns, products, sums);
-  }
-}
-
-// Rows i .. i + R - 1 of a matrix stored by column, as rowBlock sums them.
-template <int R, bool WithProducts, bool WithSums>
-inline void columnBlock(const float* aT, std::int64_t stride, const float* values, std::int32_t i,
-                        std::int32_t columns, double* products, double* sums) {
-  double product[R] = {};
-  double sum[R] = {};
-  for (std::int32_t j = 0; j < columns; ++j) {
-    const double v = WithProducts ? static_cast<double>(values[j]) : 0.0;
-    for (int r = 0; r < R; ++r) {
-      const auto x = static_cast<double>(aT[j * stride + i + r]);
-      if constexpr (WithProducts) product[r] = product[r] + x * v;
-      if constexpr (WithSums) sum[r] = sum[r] + x;
-    }
-  }
-  for (int r = 0; r < R; ++r) {
-    if constexpr (WithProducts) products[i + r] = product[r];
-    if constexpr (WithSums) sums[i + r] = sum[r];
-  }
-}
-
-template <bool WithProducts, bool WithSums>
-void columnSums(const float* aT, std::int64_t stride, const float* values, std::int32_t rows,
-                std::int32_t columns, double* products, double* sums) {
-  std::int32_t i = 0;
-  for (; i + kBlock <= rows; i += kBlock) {
-    columnBlock<kBlock, WithProducts, WithSums>(aT, stride, values, i, columns, products, sums);
-  }
-  for (; i < rows; ++i) {
-    columnBlock<1, WithProducts, WithSums>(aT, stride, values, i, columns, products, sums);
+    rowBlock<1, ByColumn, WithProducts, WithSums>(a, stride, values, i, columns, products, sums);
   }
 }
 
@@ -127,7 +103,7 @@ template <bool WithProducts, bool WithSums>
     if constexpr (WithSums) _mm256_storeu_pd(sums + i, s);
   }
   for (; i < rows; ++i) {
-    columnBlock<1, WithProducts, WithSums>(aT, stride, values, i, columns, products, sums);
+    rowBlock<1, true, WithProducts, WithSums>(aT, stride, values, i, columns, products, sums);
   }
 }
 #endif
@@ -145,7 +121,7 @@ void chooseColumnSums(const float* aT, std::int64_t stride, const float* values,
 #else
   (void)vectorised;
 #endif
-  columnSums<WithProducts, WithSums>(aT, stride, values, rows, columns, products, sums);
+  rowSums<true, WithProducts, WithSums>(aT, stride, values, rows, columns, products, sums);
 }
 
 }  // namespace
@@ -153,20 +129,20 @@ void chooseColumnSums(const float* aT, std::int64_t stride, const float* values,
 void floatRowSums(const float* a, std::int64_t stride, const float* values, std::int32_t rows,
                   std::int32_t columns, float* sums, float* products) {
   if (sums == nullptr) {
-    rowSums<true, false>(a, stride, values, rows, columns, products, sums);
+    rowSums<false, true, false>(a, stride, values, rows, columns, products, sums);
   } else {
-    rowSums<true, true>(a, stride, values, rows, columns, products, sums);
+    rowSums<false, true, true>(a, stride, values, rows, columns, products, sums);
   }
 }
 
 void doubleRowSums(const float* a, std::int64_t stride, const float* values, std::int32_t rows,
                    std::int32_t columns, double* products, double* sums) {
   if (sums == nullptr) {
-    rowSums<true, false>(a, stride, values, rows, columns, products, sums);
+    rowSums<false, true, false>(a, stride, values, rows, columns, products, sums);
   } else if (products == nullptr) {
-    rowSums<false, true>(a, stride, values, rows, columns, products, sums);
+    rowSums<false, false, true>(a, stride, values, rows, columns, products, sums);
   } else {
-    rowSums<true, true>(a, stride, values, rows, columns, products, sums);
+    rowSums<false, true, true>(a, stride, values, rows, columns, products, sums);
   }
 }
 
