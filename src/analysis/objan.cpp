@@ -152,17 +152,16 @@ bool sameCells(const KeptInverse& e, const std::int32_t* cells, std::int32_t m) 
 }  // namespace
 
 InverseCache::InverseCache(std::int32_t limit, std::int64_t lineNodes, bool keepMatrices)
-    : limit_(std::max(limit, 1)), keepMatrices_(keepMatrices) {
+    : keepMatrices_(keepMatrices) {
+  const std::int32_t most = std::max(limit, 1);
   const std::size_t perEntry =
-      sizeof(std::int32_t) * static_cast<std::size_t>(limit_) +
-      sizeof(float) * static_cast<std::size_t>(limit_) *
-          (keepMatrices ? static_cast<std::size_t>(limit_) + 1 : 1);
+      sizeof(std::int32_t) * static_cast<std::size_t>(most) + sizeof(float) * entryFloats(most);
   const auto wanted = static_cast<std::size_t>(std::max<std::int64_t>(lineNodes, 0)) + 1;
   maxEntries_ = std::clamp<std::size_t>(kCacheBytes / perEntry, 1, wanted);
   std::size_t slots = 4;
   while (slots < 2 * maxEntries_) slots *= 2;
-  cellsRoom_ = maxEntries_ * static_cast<std::size_t>(limit_);
-  valuesRoom_ = maxEntries_ * (perEntry - sizeof(std::int32_t) * limit_) / sizeof(float);
+  cellsRoom_ = maxEntries_ * static_cast<std::size_t>(most);
+  valuesRoom_ = maxEntries_ * entryFloats(most);
   for (Generation& g : generations_) {
     g.entries.reserve(maxEntries_);
     // Only what is kept is ever touched.
@@ -170,6 +169,11 @@ InverseCache::InverseCache(std::int32_t limit, std::int64_t lineNodes, bool keep
     g.values = std::make_unique_for_overwrite<float[]>(valuesRoom_);
     g.slots.assign(slots, 0);
   }
+}
+
+std::size_t InverseCache::entryFloats(std::int32_t m) const {
+  const auto count = static_cast<std::size_t>(m);
+  return count * (keepMatrices_ ? count + 1 : 1);
 }
 
 void InverseCache::clear(Generation& g) {
@@ -199,7 +203,7 @@ KeptInverse* InverseCache::lookUp(Generation& g, const std::int32_t* cells, std:
 KeptInverse* InverseCache::add(Generation& g, const std::int32_t* cells, std::int32_t m,
                                std::uint64_t hash) {
   const auto count = static_cast<std::size_t>(m);
-  const std::size_t floats = count * (keepMatrices_ ? count + 1 : 1);
+  const std::size_t floats = entryFloats(m);
   // The entries never outgrow their reserved room, so none of them moves.
   if (g.entries.size() == maxEntries_ || g.cellsUsed + count > cellsRoom_ ||
       g.valuesUsed + floats > valuesRoom_) {
@@ -240,9 +244,7 @@ KeptInverse* InverseCache::find(const std::int32_t* cells, std::int32_t m) {
       carried->hasEntrySum = earlier->hasEntrySum;
       carried->entrySum = earlier->entrySum;
       if (earlier->result == 0) {  // a failed inversion left no values
-        const std::size_t floats =
-            static_cast<std::size_t>(m) * (keepMatrices_ ? static_cast<std::size_t>(m) + 1 : 1);
-        std::copy(earlier->products, earlier->products + floats, carried->products);
+        std::copy(earlier->products, earlier->products + entryFloats(m), carried->products);
       }
       found = carried;
     }

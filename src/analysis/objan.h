@@ -49,7 +49,6 @@ class InverseCache {
   // the caller fills mean, products and inverse), or null when there is none.
   KeptInverse* keep(const std::int32_t* cells, std::int32_t m, std::int32_t result,
                     const char* reason);
-  bool keepsMatrices() const { return keepMatrices_; }
   // The kept inverse of the last estimate; null when it was not kept (its
   // inverse is then in the workspace's matrix).
   KeptInverse* usedEntry = nullptr;
@@ -70,7 +69,10 @@ class InverseCache {
   KeptInverse* lookUp(Generation& g, const std::int32_t* cells, std::int32_t m,
                       std::uint64_t hash);
 
-  std::int32_t limit_;
+  // Values an entry of m cells takes: its row products and, when kept, its
+  // inverse.
+  std::size_t entryFloats(std::int32_t m) const;
+
   bool keepMatrices_;
   std::size_t maxEntries_;
   std::size_t cellsRoom_;   // per generation

@@ -66,10 +66,11 @@ void recordErrorVariance(FloatGrid3D& field, float e, std::int64_t p, std::int64
 
 // The storage of one thread's estimates: the candidate and chosen-cell arrays
 // and sort keys, the matrix and the pivot records, the selection's window,
-// column cursors and row reaches (carried from node to node along the thread's own
-// walk), and the inverses it made on its current and previous line. It works on a copy of the layer's
-// workspace whose per-node arrays point here; the layer's data cells, column
-// index and correlation table stay shared and are only read.
+// column cursors and row reaches (carried from node to node along the
+// thread's own walk), and the inverses it made on its current and previous
+// line. It works on a copy of the layer's workspace whose per-node arrays
+// point here; the layer's data cells, column index and correlation table stay
+// shared and are only read.
 class NodeScratch {
  public:
   NodeScratch(const OaWorkspace& layer, std::int64_t lineNodes, bool keepMatrices)
@@ -215,8 +216,9 @@ std::int32_t analyseLayer(OaWorkspace& ws, FloatGrid2D& grid, std::int32_t nData
         if (OBJAN(scratch->ws, m, &grid.data[at], settings, &scratch->inverse) == 0) {
           ++successes;
           if (input.errorField != nullptr) {
-            recordErrorVariance(*input.errorField, estimateErrorVariance(scratch->ws, scratch->inverse, m), j - input.jOff,
-                                k - input.kOff, l - input.lOff);
+            recordErrorVariance(*input.errorField,
+                                estimateErrorVariance(scratch->ws, scratch->inverse, m),
+                                j - input.jOff, k - input.kOff, l - input.lOff);
           }
         } else {
           ++failed;

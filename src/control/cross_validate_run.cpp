@@ -330,7 +330,7 @@ void crossValidateRun(Run& run, const char* parameterFile) {
   report.printf("Table written to %s\n", csvPath.c_str());
   report.printf("-------------------------------------------------\n\n");
 
-  freeRunArrays(state);
+  releaseAll(state);
   restoreSignalHandlers();
 }
 

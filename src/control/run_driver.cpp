@@ -167,15 +167,6 @@ int runPhases(Run& run, RunSummary* summary, std::string* writeProblem) {
   return written;
 }
 
-void freeRunArrays(RunState& state) {
-  grid3DFree(state.localValues);
-  scatterDataFree(state.scatter);
-  descriptionFree(state.resultDescription);
-  state.resultDescription = nullptr;
-  descriptionFree(state.bathymetryDescription);
-  state.bathymetryDescription = nullptr;
-}
-
 void runDriver(Run& run) {
   installSignalHandlers();
   // An interrupt reaches a process also while it waits on another.
@@ -196,7 +187,7 @@ void runDriver(Run& run) {
     }
     throw error;
   }
-  freeRunArrays(run.state);
+  releaseAll(run.state);
   restoreSignalHandlers();
   if (rankLeads()) printRunSummary(stderr, summary, run.invocation.quiet);
 }

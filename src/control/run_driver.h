@@ -47,8 +47,6 @@ void runDriver(Run& run);
 // writeProblem with why the result could not be written.
 int runPhases(Run& run, RunSummary* summary = nullptr, std::string* writeProblem = nullptr);
 
-void freeRunArrays(RunState& state);
-
 // The whole run of a parameter file as invoked: setup and driver, then the
 // end of the process, "Successful" with exit code 0 or, for an error thrown
 // anywhere below, its log lines, message and exit code. The one place where a
